@@ -17,6 +17,9 @@ struct KXACommandError : std::runtime_error {
 // Registration hooks, one per area; main.cpp calls them in order.
 void registerDateCommands(CLI::App& app);
 void registerRegexCommands(CLI::App& app);
+// Verbs added under "date" (registerDateCommands creates it).
+void registerDateParseCommand(CLI::App& dateCommand);
+void registerDateFormatCommand(CLI::App& dateCommand);
 
 // Prints one JSON object on its own line. Invalid UTF-8 in strings is
 // replaced rather than thrown about, so hostile input cannot abort output.
