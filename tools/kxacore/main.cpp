@@ -14,10 +14,9 @@ int main(int argc, char** argv) {
   app.require_subcommand(1);
   app.set_version_flag("--version", "kxacore 0.1.0");
   registerDateCommands(app);
-  if (CLI::App* date = app.get_subcommand_no_throw("date")) {
-    registerDateParseCommand(*date);
-    registerDateFormatCommand(*date);
-  }
+  CLI::App* date = app.get_subcommand("date");  // registerDateCommands made it
+  registerDateParseCommand(*date);
+  registerDateFormatCommand(*date);
   registerRegexCommands(app);
   try {
     app.parse(argc, argv);
