@@ -57,7 +57,10 @@ double asDouble(const KXAFormatArg& arg) {
 std::string printfSpec(const Spec& spec, std::string_view length) {
   std::string out = "%" + spec.flags;
   if (spec.width >= 0) out += std::to_string(spec.width);
-  if (spec.precision >= 0) out += "." + std::to_string(spec.precision);
+  if (spec.precision >= 0) {
+    out += '.';
+    out += std::to_string(spec.precision);
+  }
   out += length;
   out += spec.conversion;
   return out;
