@@ -21,7 +21,8 @@ int main(int argc, char** argv) {
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
-    return app.exit(error);
+    // --help and --version end here with 0; every usage error exits with 2.
+    return app.exit(error) == 0 ? 0 : 2;
   } catch (const KXACommandError& error) {
     std::cerr << "kxacore: " << error.what() << '\n';
     return 1;
