@@ -1,9 +1,13 @@
 #include "kxacore/Data/Dates/KXDDate.h"
 
+#include <cstdio>
 #include <ctime>
 
+#include "kxacore/Data/Dates/KXDDateFormatInfo.h"
 #include "kxacore/Extensions/KXAStringExtensions.h"
 #include "kxacore/Platform/KXALocalizedString.h"
+#include "kxacore/Platform/KXAStringFormat.h"
+#include "kxacore/Platform/KXAUserDefaults.h"
 
 namespace {
 
@@ -91,8 +95,17 @@ std::optional<KXDDate> KXDDate::decodeFromRecordData(std::string_view data) {
   return dateWithRecordData(data);
 }
 
+KXDDate::KXDDate() : formatter_(KXDDateFormatInfo::defaultFormatter()) {
+  if (!formatter_) return;
+  if (auto about = KXAUserDefaults::stringForKey(kKXAPreferencesDateNameFactLabelsAboutKey);
+      about && !about->empty()) {
+    formatter_->setFuzzinessText(std::move(*about));
+  }
+}
+
 KXDDate::KXDDate(std::int64_t year, std::int64_t month, std::int64_t day, std::uint64_t modifier)
-    : code_(encodeRecordWithYear(year, month, day, modifier)) {
+    : code_(encodeRecordWithYear(year, month, day, modifier)),
+      formatter_(KXDDateFormatInfo::defaultFormatter()) {
   sortDate1_ = calculateSortDate(code_);
   decodeRecordDate(code_);
 }
@@ -170,6 +183,35 @@ void KXDDate::recordDateToGregorian(std::int64_t code, std::int64_t* year, std::
 
 std::string KXDDate::weekDay() const {
   return KXALocalizedString(kCalendarWeekDays[static_cast<std::size_t>(dayOfWeek())]);
+}
+
+// ---- Display ----------------------------------------------------------------
+
+std::string KXDDate::stringWithGeneralFormat() const { return stringWithFormat(std::nullopt, nullptr); }
+
+std::string KXDDate::stringWithFormat(std::string_view format) const {
+  return stringWithFormat(std::optional<std::string_view>(format), nullptr);
+}
+
+std::string KXDDate::stringWithFormatInfo(KXDDateFormatInfo* info) const {
+  return stringWithFormat(std::nullopt, info);
+}
+
+std::string KXDDate::stringWithFormat(std::optional<std::string_view> format,
+                                      KXDDateFormatInfo* info) const {
+  if (!formatter_) return {};
+  if (!info) {
+    formatter_->setCommonEra(
+        KXAUserDefaults::integerForKey(kKXAPreferencesDateNameAncientDateNotationTagKey) == 1);
+  }
+  return formatter_->stringForObject(*this, format, info).value_or(std::string());
+}
+
+std::string KXDDate::description() const {
+  char inherited[48];
+  std::snprintf(inherited, sizeof inherited, "<KXDDate: %p>", static_cast<const void*>(this));
+  return KXAStringWithFormat("%@ = { text='%@', stringWithGeneralFormat='%@' }", inherited,
+                             text_ ? *text_ : std::string("(null)"), stringWithGeneralFormat());
 }
 
 // ---- Ordering and averages --------------------------------------------------

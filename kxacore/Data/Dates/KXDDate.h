@@ -200,6 +200,35 @@ class KXDDate {
   // The localised name of dayOfWeek() (keys "Sunday" ... "Saturday").
   [[nodiscard]] std::string weekDay() const;
 
+  // ---- Display ------------------------------------------------------------
+  // Display texts come from the date's formatter: the shared
+  // KXDDateFormatInfo::defaultFormatter() taken at construction (see
+  // KXDDateFormatInfo.h for formats). All of these give "" when that
+  // formatter is null, which happens for dates made after its one-shot
+  // KXDDateFormatInfo::resetDefaultFormat().
+
+  // In the formatter's default format.
+  [[nodiscard]] std::string stringWithGeneralFormat() const;
+  // In `format` ("G", "MDY", "d Mmmm yyyy" ...).
+  [[nodiscard]] std::string stringWithFormat(std::string_view format) const;
+  // In the default format of `info`, which does the formatting.
+  [[nodiscard]] std::string stringWithFormatInfo(KXDDateFormatInfo* info) const;
+  // Without `info`, the shared formatter first takes its era notation from
+  // the preference "KXADateNameAncientDateNotationTag" (1: BCE/CE, else
+  // BC/AD), then formats. With `info`, `info` formats (its settings, and its
+  // default format when `format` is nullopt) under the shared formatter's
+  // lock; it must stay alive for the call.
+  [[nodiscard]] std::string stringWithFormat(std::optional<std::string_view> format,
+                                             KXDDateFormatInfo* info) const;
+  // For logs: "<KXDDate: 0x...> = { text='...', stringWithGeneralFormat='...' }",
+  // with the value's address in the first part and text '(null)' unless a
+  // text date.
+  [[nodiscard]] std::string description() const;
+  // The formatter taken at construction; shared by every date.
+  [[nodiscard]] const std::shared_ptr<KXDDateFormatInfo>& formatter() const noexcept {
+    return formatter_;
+  }
+
   // ---- Ordering and averages ----------------------------------------------
 
   // -1, 0 or +1 by sort keys, with qualifiers on the same day ordered
@@ -299,7 +328,11 @@ class KXDDate {
                                                              std::int64_t day) noexcept;
   static constexpr void advanceOneYear(MetonicInfo& info) noexcept;
 
-  KXDDate() = default;  // only the factories build one
+  // Only the factories build one. The empty value also carries the user's
+  // "about" label (preference "KXADateNameFactLabelsAbout") over to the
+  // shared formatter; the parser's KXDDate(year, month, day, modifier) skips
+  // that preference read.
+  KXDDate();
   void setFields(const KXDCalendarDate& date) noexcept {
     year_ = date.year;
     month_ = date.month;
@@ -315,7 +348,8 @@ class KXDDate {
   std::int64_t month_ = 0;
   std::int64_t day_ = 0;
   std::uint64_t modifier_ = 0;
-  // Shared by every date; set once the formatter exists. Null until then.
+  // KXDDateFormatInfo::defaultFormatter() at construction, shared by every
+  // date; null after the formatter's one-shot reset.
   std::shared_ptr<KXDDateFormatInfo> formatter_;
   std::optional<std::string> text_;
 };
