@@ -95,8 +95,8 @@ bool KXAUserDefaults::saveToFile(const std::filesystem::path& path) {
   {
     auto& d = defaults();
     std::scoped_lock lock(d.mutex);
-    for (const auto& [key, value] : d.store) {
-      std::visit([&](const auto& v) { document[key] = v; }, value);
+    for (const auto& entry : d.store) {
+      std::visit([&](const auto& v) { document[entry.first] = v; }, entry.second);
     }
   }
   const std::string text =

@@ -17,6 +17,7 @@ struct KXACommandError : std::runtime_error {
 // Registration hooks, one per area; main.cpp calls them in order.
 void registerDateCommands(CLI::App& app);
 void registerRegexCommands(CLI::App& app);
+void registerNameCommands(CLI::App& app);
 // Verbs added under "date" (registerDateCommands creates it).
 void registerDateParseCommand(CLI::App& dateCommand);
 void registerDateFormatCommand(CLI::App& dateCommand);

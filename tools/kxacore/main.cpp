@@ -18,6 +18,7 @@ int main(int argc, char** argv) {
   registerDateParseCommand(*date);
   registerDateFormatCommand(*date);
   registerRegexCommands(app);
+  registerNameCommands(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
