@@ -18,6 +18,7 @@ struct KXACommandError : std::runtime_error {
 void registerDateCommands(CLI::App& app);
 void registerRegexCommands(CLI::App& app);
 void registerNameCommands(CLI::App& app);
+void registerPlaceCommands(CLI::App& app);
 // Verbs added under "date" (registerDateCommands creates it).
 void registerDateParseCommand(CLI::App& dateCommand);
 void registerDateFormatCommand(CLI::App& dateCommand);

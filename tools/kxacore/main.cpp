@@ -19,6 +19,7 @@ int main(int argc, char** argv) {
   registerDateFormatCommand(*date);
   registerRegexCommands(app);
   registerNameCommands(app);
+  registerPlaceCommands(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {
