@@ -1,5 +1,7 @@
 // Runs the kxacore program itself: the date verbs' output and exit status.
 #include <gtest/gtest.h>
+
+#include "tests/tools/KXACliRun.h"
 #include <nlohmann/json.hpp>
 #include <sys/wait.h>
 
@@ -9,21 +11,10 @@
 
 namespace {
 
-struct CliRun {
-  std::string output;
-  int status = -1;
-};
+using CliRun = KXACliRun;
 
 CliRun runDateCli(const std::string& arguments) {
-  CliRun run;
-  const std::string command = std::string(KXA_CLI_PATH) + " date " + arguments + " 2>/dev/null";
-  FILE* pipe = popen(command.c_str(), "r");
-  if (!pipe) return run;
-  char buffer[512];
-  while (const std::size_t n = fread(buffer, 1, sizeof buffer, pipe)) run.output.append(buffer, n);
-  const int status = pclose(pipe);
-  run.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  return run;
+  return runKxacore("date " + arguments);
 }
 
 TEST(DateCliTest, EncodePrintsTheCodeAndItsReading) {

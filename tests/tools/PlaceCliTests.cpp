@@ -1,5 +1,7 @@
 // Runs the kxacore program itself: the place verbs' output and exit status.
 #include <gtest/gtest.h>
+
+#include "tests/tools/KXACliRun.h"
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -11,39 +13,10 @@
 
 namespace {
 
-struct CliRun {
-  std::string output;
-  int status = -1;
-};
+using CliRun = KXACliRun;
 
-std::string quoted(const std::string& argument) {
-  std::string out = "'";
-  for (const char c : argument) {
-    if (c == '\'') {
-      out.append("'\\''");
-    } else {
-      out.push_back(c);
-    }
-  }
-  out.push_back('\'');
-  return out;
-}
-
-// stderr is kept apart: with `withErrors` it replaces stdout in the result.
 CliRun runCli(const std::vector<std::string>& arguments, bool withErrors = false) {
-  std::string command = KXA_CLI_PATH;
-  // Appended piece by piece: GCC 12 misreads `" " + string` at -O3 (a false
-  // -Wrestrict).
-  for (const std::string& argument : arguments) command.append(" ").append(quoted(argument));
-  command += withErrors ? " 2>&1 >/dev/null" : " 2>/dev/null";
-  CliRun run;
-  FILE* pipe = popen(command.c_str(), "r");
-  if (!pipe) return run;
-  char buffer[512];
-  while (const std::size_t n = fread(buffer, 1, sizeof buffer, pipe)) run.output.append(buffer, n);
-  const int status = pclose(pipe);
-  run.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  return run;
+  return runKxacore(arguments, withErrors);
 }
 
 TEST(PlaceCliTest, DecodesRecordsAsJson) {

@@ -1,5 +1,7 @@
 // Runs the kxacore program itself: the regex verb's output and exit status.
 #include <gtest/gtest.h>
+
+#include "tests/tools/KXACliRun.h"
 #include <sys/wait.h>
 
 #include <cstdio>
@@ -7,22 +9,9 @@
 
 namespace {
 
-struct CliRun {
-  std::string output;
-  int status = -1;
-};
+using CliRun = KXACliRun;
 
-CliRun runCli(const std::string& arguments) {
-  CliRun run;
-  const std::string command = std::string(KXA_CLI_PATH) + " " + arguments + " 2>/dev/null";
-  FILE* pipe = popen(command.c_str(), "r");
-  if (!pipe) return run;
-  char buffer[512];
-  while (const std::size_t n = fread(buffer, 1, sizeof buffer, pipe)) run.output.append(buffer, n);
-  const int status = pclose(pipe);
-  run.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  return run;
-}
+CliRun runCli(const std::string& arguments) { return runKxacore(arguments); }
 
 TEST(RegexCliTest, PrintsMatchesAsJson) {
   const CliRun run = runCli("regex match --json '(a)|(b)' xb");
