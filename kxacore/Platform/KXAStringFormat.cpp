@@ -29,7 +29,7 @@ void appendCodePoint(std::string& out, std::uint32_t cp) {
 }
 
 // One conversion specification, already split into its parts.
-struct Spec {
+struct Directive {
   std::string flags;
   int width = -1;
   int precision = -1;
@@ -54,15 +54,15 @@ double asDouble(const KXAFormatArg& arg) {
   return 0;
 }
 
-std::string printfSpec(const Spec& spec, std::string_view length) {
-  std::string out = "%" + spec.flags;
-  if (spec.width >= 0) out += std::to_string(spec.width);
-  if (spec.precision >= 0) {
+std::string printfDirective(const Directive& directive, std::string_view length) {
+  std::string out = "%" + directive.flags;
+  if (directive.width >= 0) out += std::to_string(directive.width);
+  if (directive.precision >= 0) {
     out += '.';
-    out += std::to_string(spec.precision);
+    out += std::to_string(directive.precision);
   }
   out += length;
-  out += spec.conversion;
+  out += directive.conversion;
   return out;
 }
 
@@ -80,53 +80,53 @@ void appendPrintf(std::string& out, const std::string& format, T value) {
   out.append(large.data(), static_cast<std::size_t>(needed));
 }
 
-// Pads a text to the spec's width, honouring "-" for left alignment; a
+// Pads a text to the directive's width, honouring "-" for left alignment; a
 // precision cuts the text to that many bytes (as printf's %.Ns does).
-void appendText(std::string& out, const Spec& spec, std::string_view text) {
-  if (spec.precision >= 0 && static_cast<std::size_t>(spec.precision) < text.size()) {
-    text = text.substr(0, static_cast<std::size_t>(spec.precision));
+void appendText(std::string& out, const Directive& directive, std::string_view text) {
+  if (directive.precision >= 0 && static_cast<std::size_t>(directive.precision) < text.size()) {
+    text = text.substr(0, static_cast<std::size_t>(directive.precision));
   }
-  const std::size_t width = spec.width > 0 ? static_cast<std::size_t>(spec.width) : 0;
+  const std::size_t width = directive.width > 0 ? static_cast<std::size_t>(directive.width) : 0;
   const std::size_t padding = width > text.size() ? width - text.size() : 0;
-  const bool left = spec.flags.find('-') != std::string::npos;
+  const bool left = directive.flags.find('-') != std::string::npos;
   if (!left) out.append(padding, ' ');
   out.append(text);
   if (left) out.append(padding, ' ');
 }
 
-void appendArgument(std::string& out, const Spec& spec, const KXAFormatArg& arg) {
-  switch (spec.conversion) {
+void appendArgument(std::string& out, const Directive& directive, const KXAFormatArg& arg) {
+  switch (directive.conversion) {
     case '@':
     case 's':
       if (arg.kind() == KXAFormatArg::Kind::kText) {
-        appendText(out, spec, arg.text());
+        appendText(out, directive, arg.text());
       } else if (arg.kind() == KXAFormatArg::Kind::kInteger) {
-        appendText(out, spec, std::to_string(arg.integer()));
+        appendText(out, directive, std::to_string(arg.integer()));
       } else {
         std::string number;
         appendPrintf(number, "%g", arg.number());
-        appendText(out, spec, number);
+        appendText(out, directive, number);
       }
       return;
     case 'd': case 'i':
-      appendPrintf(out, printfSpec(spec, "ll"), static_cast<long long>(asInteger(arg)));
+      appendPrintf(out, printfDirective(directive, "ll"), static_cast<long long>(asInteger(arg)));
       return;
     case 'u': case 'x': case 'X': case 'o':
-      appendPrintf(out, printfSpec(spec, "ll"), static_cast<unsigned long long>(asInteger(arg)));
+      appendPrintf(out, printfDirective(directive, "ll"), static_cast<unsigned long long>(asInteger(arg)));
       return;
     case 'c': {
       std::string one(1, static_cast<char>(asInteger(arg)));
-      appendText(out, spec, one);
+      appendText(out, directive, one);
       return;
     }
     case 'C': {
       std::string one;
       appendCodePoint(one, static_cast<std::uint32_t>(asInteger(arg)));
-      appendText(out, spec, one);
+      appendText(out, directive, one);
       return;
     }
     case 'f': case 'F': case 'e': case 'E': case 'g': case 'G':
-      appendPrintf(out, printfSpec(spec, ""), asDouble(arg));
+      appendPrintf(out, printfDirective(directive, ""), asDouble(arg));
       return;
     default:
       return;
@@ -166,7 +166,7 @@ std::string KXAStringWithFormatArgs(std::string_view format,
       ++i;
       continue;
     }
-    Spec spec;
+    Directive directive;
     // Positional argument "%2$@".
     std::size_t position = 0;
     if (isDigit(format[i])) {
@@ -178,26 +178,26 @@ std::string KXAStringWithFormatArgs(std::string_view format,
       }
     }
     while (i < format.size() && std::string_view("-+ #0'").find(format[i]) != std::string_view::npos) {
-      if (format[i] != '\'') spec.flags += format[i];
+      if (format[i] != '\'') directive.flags += format[i];
       ++i;
     }
-    if (i < format.size() && isDigit(format[i])) spec.width = readNumber(format, i);
+    if (i < format.size() && isDigit(format[i])) directive.width = readNumber(format, i);
     if (i < format.size() && format[i] == '.') {
       ++i;
-      spec.precision = readNumber(format, i);
+      directive.precision = readNumber(format, i);
     }
     while (i < format.size() && std::string_view("hlqLzjt").find(format[i]) != std::string_view::npos) ++i;
     if (i >= format.size()) {
       out.append(format.substr(percent));  // unterminated: keep the text as written
       break;
     }
-    spec.conversion = format[i++];
-    if (std::string_view("@sdiuxXocCfFeEgG").find(spec.conversion) == std::string_view::npos) {
+    directive.conversion = format[i++];
+    if (std::string_view("@sdiuxXocCfFeEgG").find(directive.conversion) == std::string_view::npos) {
       out.append(format.substr(percent, i - percent));  // unknown: keep as written
       continue;
     }
     const std::size_t index = position > 0 ? position - 1 : nextArg++;
-    if (index < args.size()) appendArgument(out, spec, *(args.begin() + index));
+    if (index < args.size()) appendArgument(out, directive, *(args.begin() + index));
   }
   return out;
 }
