@@ -28,7 +28,7 @@ void appendCodePoint(std::string& out, std::uint32_t cp) {
   }
 }
 
-// One conversion specification, already split into its parts.
+// One conversion directive ("%-5.2ld"), already split into its parts.
 struct Directive {
   std::string flags;
   int width = -1;
