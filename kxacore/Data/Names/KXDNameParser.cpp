@@ -25,6 +25,9 @@ using kxd_internal::kTitleFragments;
 // ---------------------------------------------------------------------------
 // Patterns
 
+// Index of the parenthesis form among the three family-delimiter expressions.
+constexpr int kParenthesisExpression = 2;
+
 std::string escapePeriods(std::string_view fragment) {
   std::string escaped;
   for (const char c : fragment) {
@@ -401,7 +404,10 @@ bool KXDNameParser::matchSlashesUsingRegex(int expression) {
   }
 
   std::string familyText = middle;
-  if (pattern.find("\\(") != std::string::npos && !after.empty()) {
+  // Only the parenthesis form reads a nickname or family words after its
+  // group; the backslash form, like the slash form, keeps what follows as the
+  // suffix ("John \Smith\ Brown").
+  if (expression == kParenthesisExpression && !after.empty()) {
     if (after.find('(') != std::string::npos) {
       // Another opening parenthesis: what follows is the family, and (with
       // something before) the suffix as well.

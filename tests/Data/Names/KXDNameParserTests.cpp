@@ -70,7 +70,12 @@ INSTANTIATE_TEST_SUITE_P(Slashes, NameShapeTest, testing::Values(
 INSTANTIATE_TEST_SUITE_P(Backslashes, NameShapeTest, testing::Values(
     NameCase{"John \\Smith\\", "", "John", "Smith", "", "", 0},
     NameCase{"John \\Smith\\ Sr", "", "John", "Smith", "", "Sr", 0},
-    NameCase{"John \\\\", "", "John", "", "", "", 0}));
+    NameCase{"John \\\\", "", "John", "", "", "", 0},
+    // What follows the family is read as after slashes: no nickname, no
+    // family words taken from it.
+    NameCase{"John \\Smith\\ Brown", "", "John", "Smith", "", "Brown", 0},
+    NameCase{"John \\Smith\\ van Berg", "", "John", "Smith", "", "van Berg", 0},
+    NameCase{"John \\Smith\\ (Jones", "", "John", "Smith", "", "(Jones", 0}));
 
 // A parenthesised family keeps its parentheses; one followed by more words
 // is a nickname.
