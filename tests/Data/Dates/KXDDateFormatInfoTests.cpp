@@ -196,6 +196,17 @@ TEST_F(DateFormatTest, CommonEraSwitchesEraTextsAndTheParserSetting) {
   EXPECT_EQ(format(KXDDate(999, 0, 0)), "999 AD");
 }
 
+// A change acts on the parser settings as a newly made parser would: the
+// ancient-date-type warning comes back on. No change, no effect.
+TEST_F(DateFormatTest, CommonEraChangeSwitchesTheAncientDateWarningOn) {
+  KXDDateParserSettings::setAncientDateTypeWarning(false);
+  formatter->setCommonEra(false);
+  EXPECT_FALSE(KXDDateParserSettings::isAncientDateTypeWarning());
+  formatter->setCommonEra(true);
+  EXPECT_TRUE(KXDDateParserSettings::isAncientDateTypeWarning());
+  EXPECT_TRUE(KXDDateParserSettings::isCommonEra());
+}
+
 TEST_F(DateFormatTest, AdCutoffYear) {
   EXPECT_EQ(formatter->adCutoffYear(), 1000);
   formatter->setAdCutoffYear(2000);
