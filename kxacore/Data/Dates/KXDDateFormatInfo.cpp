@@ -200,9 +200,11 @@ bool KXDDateFormatInfo::isCommonEra() const {
 void KXDDateFormatInfo::reloadCommonEraInfo() {
   bc_ = localized(commonEra_ ? "DateBCE" : "DateBC");
   ad_ = localized(commonEra_ ? "DateCE" : "DateAD");
-  // The parser reads eras by the same notation. (Making a parser only to
-  // set this flag, as a parser's own setter would, is not needed: the
-  // setting is process-wide.)
+  // The parser reads eras by the same notation. This does what making a
+  // parser and setting its common era does to the process-wide settings
+  // (a new parser also switches the ancient-date-type warning back on),
+  // without building a parser's tables.
+  KXDDateParserSettings::setAncientDateTypeWarning(true);
   KXDDateParserSettings::setCommonEra(commonEra_);
 }
 

@@ -100,9 +100,11 @@ class KXDDateFormatInfo : public KXDFormatInfo {
   //   otherwise "mod <month><sep><day>, yyyy".
   void setupDefaultFormat();
 
-  // BCE/CE instead of BC/AD. A change reloads the era texts and sets the
-  // date parser's process-wide common-era setting to the same value
-  // (KXDDateParserSettings::setCommonEra), so parsing follows the display.
+  // BCE/CE instead of BC/AD. A change reloads the era texts and does to the
+  // date parser's process-wide settings what creating a parser and setting
+  // its common era would: the ancient-date-type warning is switched on and
+  // the common-era setting takes the same value, so parsing follows the
+  // display.
   void setCommonEra(bool commonEra);
   [[nodiscard]] bool isCommonEra() const;
   // The era text is printed for years 1 to this (default 1000) and for every

@@ -86,7 +86,14 @@ INSTANTIATE_TEST_SUITE_P(
         FormatCase{1900, 3, 0, kQuarter, "mm/yyyy", "03 Qtr/1900"},
         FormatCase{0, 0, 0, 0, "G", ""},                   // nothing known
         FormatCase{0, 0, 0, kAbout, "mod yyyy", ""},
-        FormatCase{1900, 13, 1, 0, "G", ""}));             // an impossible date keeps no parts
+        FormatCase{1900, 13, 1, 0, "G", ""},               // an impossible date keeps no parts
+        // A part flagged unknown is not printed, though the code holds it.
+        FormatCase{1900, 3, 5, 0x080, "G", "Mar 1900"},
+        FormatCase{1900, 3, 5, 0x080, "d/m/yyyy", "3/1900"},
+        FormatCase{1900, 3, 5, 0x040, "G", "05 1900"},
+        FormatCase{1900, 3, 5, 0x040 | kQuarter, "mm Mmm yyyy", "1900"},
+        FormatCase{1900, 3, 5, 0x020, "LMDY", "March 05"},
+        FormatCase{1900, 3, 5, 0x020 | kDual, "yyyy", ""}));
 
 INSTANTIATE_TEST_SUITE_P(
     Qualifiers, DateFormatTableTest,
@@ -194,6 +201,17 @@ TEST_F(DateFormatTest, CommonEraSwitchesEraTextsAndTheParserSetting) {
   formatter->setCommonEra(false);
   EXPECT_FALSE(KXDDateParserSettings::isCommonEra());
   EXPECT_EQ(format(KXDDate(999, 0, 0)), "999 AD");
+}
+
+// A change acts on the parser settings as a newly made parser would: the
+// ancient-date-type warning comes back on. No change, no effect.
+TEST_F(DateFormatTest, CommonEraChangeSwitchesTheAncientDateWarningOn) {
+  KXDDateParserSettings::setAncientDateTypeWarning(false);
+  formatter->setCommonEra(false);
+  EXPECT_FALSE(KXDDateParserSettings::isAncientDateTypeWarning());
+  formatter->setCommonEra(true);
+  EXPECT_TRUE(KXDDateParserSettings::isAncientDateTypeWarning());
+  EXPECT_TRUE(KXDDateParserSettings::isCommonEra());
 }
 
 TEST_F(DateFormatTest, AdCutoffYear) {
