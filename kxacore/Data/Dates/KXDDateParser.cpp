@@ -317,8 +317,7 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
                                         KXALocale::shortMonthNames(code));
   }
 
-  // Qualifier words; "wft est" is accepted and dropped, and so is the GEDCOM
-  // "int" (an interpreted date: the date itself is what we keep).
+  // Qualifier words; "wft est" is accepted and dropped.
   const auto addWords = [&im](std::string_view list, std::uint64_t value) {
     for (const std::string_view piece : kxa_split(list, ",")) {
       const auto it = std::find_if(im.words.begin(), im.words.end(),
@@ -342,7 +341,6 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
   addWords(KXALocalizedString("DateParserCalculated"), kKXDModifierCalculated);
   addWords(KXALocalizedString("DateParserBetween"), 0);
   addWords("wft est", 0);
-  addWords(KXALocalizedString("DateParserInterpreted"), 0);
 
   // Era and quarter fragments.
   bcString_ = punctuatedRegExpStringFromString(KXALocalizedString("DateParserBC"), false);

@@ -18,8 +18,9 @@
 //     Italian, Swedish and Spanish (12 März 1850, 3 juillet 1789), quarters
 //     (Mar Qtr 1850), dual years (1750/51), eras (BC, BCE, AD, CE);
 //   - a qualifier word in front: before/bef, after/aft, about/abt/circa/ca/c/
-//     est ..., calculated/cal, between/bet (no qualifier), "wft est" and the
-//     GEDCOM "int" (interpreted; accepted and dropped, no qualifier);
+//     est ..., calculated/cal, between/bet (no qualifier), "wft est"
+//     (accepted and dropped, no qualifier); no other word is a qualifier, so
+//     the GEDCOM "INT 1850" reads "INT" as an unknown month (reason 7);
 //   - ranges: "bet 1800 and 1810", "from 1800 to 1810", "1800-1810",
 //     "3 Mar - 5 Apr 1900" (the year is copied to the half that lacks it);
 //     the two ends always come back in ascending order;
@@ -153,7 +154,7 @@ class KXDDateParser {
   // Every problem, ranked.
   [[nodiscard]] const std::vector<KXDParseErrorInfo>& errors() const { return errors_; }
   // The value of the qualifier word found in front (1 before, 2 after,
-  // 3 about, 0x100 calculated; 0 for none, between, "wft est" and "int").
+  // 3 about, 0x100 calculated; 0 for none, between and "wft est").
   [[nodiscard]] std::uint64_t qualifier() const { return qualifier_; }
   // The record codes found (0 = none); kept even when date() is nullopt.
   [[nodiscard]] std::int64_t firstDateCode() const { return firstCode_; }

@@ -6,6 +6,7 @@
 #include <sstream>
 #include <string>
 #include <type_traits>
+#include <utility>
 #include <vector>
 
 #include "kxacore/Extensions/KXAStringExtensions.h"
@@ -328,9 +329,31 @@ INSTANTIATE_TEST_SUITE_P(
                       QualifierCase{"c1650", 3, 1650}, QualifierCase{"EST 1850", 3, 1850},
                       QualifierCase{"BEF 1850", 1, 1850}, QualifierCase{"Before: 1850", 1, 1850},
                       QualifierCase{"AFT 1850", 2, 1850}, QualifierCase{"CAL 1850", 0x100, 1850},
-                      QualifierCase{"calc. 1850", 0x100, 1850}, QualifierCase{"INT 1850", 0, 1850},
+                      QualifierCase{"calc. 1850", 0x100, 1850}, QualifierCase{"btw 1850", 0, 1850},
                       QualifierCase{"wft est 1850", 0, 1850}, QualifierCase{"WFT EST 1850", 0, 1850},
                       QualifierCase{"1850", 0, 1850}));
+
+TEST_F(DateParserTest, QualifierTableHoldsTheLocalisedWordsThenWftEst) {
+  using Words = std::vector<std::pair<std::string, std::uint64_t>>;
+  Words expected;
+  const auto add = [&expected](std::initializer_list<const char*> words, std::uint64_t value) {
+    for (const char* w : words) expected.emplace_back(w, value);
+  };
+  add({"before", "bef"}, 1);
+  add({"about", "abt", "circa", "ca", "c", "approx", "approximately", "around", "est",
+       "estimated"},
+      3);
+  add({"after", "aft"}, 2);
+  add({"calculated", "calc", "cal"}, 0x100);
+  add({"between", "bet", "btw"}, 0);
+  add({"wft est"}, 0);
+  EXPECT_EQ(parser->wordsToQualifier(), expected);
+  // Nothing else is a qualifier: GEDCOM's INT is read as a month word.
+  EXPECT_TRUE(parser->parseDate("INT 1850"));
+  EXPECT_EQ(parser->qualifier(), 0u);
+  EXPECT_EQ(parser->errorCode(), kKXDParseErrorMonthOutOfRange);
+  EXPECT_EQ(parser->errorDateString(), "INT");
+}
 
 TEST_F(DateParserTest, QualifierNeedsDigitBlankOrColonAfterIt) {
   parser->parseDate("abtx 1850");
