@@ -693,7 +693,8 @@ struct KXDDateParser::Steps {
         case KXDDateParserTreatment::kNo:
           break;
         case KXDDateParserTreatment::kUnset:
-          data.addError(kKXDParseErrorTwoDigitYear, joinData(y, era));
+          // Untrimmed, unlike reasons 2 and 8: without an era it ends in a blank.
+          data.addError(kKXDParseErrorTwoDigitYear, KXAStringWithFormat("%@ %@", y, era));
           break;
       }
     } else if (y.size() == 1) {

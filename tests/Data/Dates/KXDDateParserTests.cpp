@@ -501,6 +501,9 @@ INSTANTIATE_TEST_SUITE_P(
         ErrorCase{"13 1850", 7, "13", false}, ErrorCase{"xyz 1850", 7, "xyz", true},
         ErrorCase{"13/5/1850", 13, "13/5/1850", false}, ErrorCase{"7000", 8, "7000", true},
         ErrorCase{"5 1850", 0, "", true}, ErrorCase{"5 1", 2, "1", true},
+        // Two-digit years quote year and era untrimmed; one-digit ones trimmed.
+        ErrorCase{"12 Jun 99", 1, "99 ", true}, ErrorCase{"Jun 45 AD", 1, "45 AD", true},
+        ErrorCase{"5 1 AD", 2, "1 AD", true},
         ErrorCase{"5000", 4, "5000", true}, ErrorCase{"1850 CE", 5, "1850 CE", true},
         ErrorCase{"1850 AD", 0, "", true}, ErrorCase{"12 1850 abc", 13, "12 1850 abc", false},
         ErrorCase{"5 1850 Mar", 12, "5 1850 Mar", false},
