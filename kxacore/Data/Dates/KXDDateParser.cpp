@@ -214,6 +214,21 @@ bool mayFoldToAscii(std::string_view text) {
 
 bool isKeywordCode(std::int64_t code) { return (code & kKXDEnumerationFlag) != 0; }
 
+bool isContinuationByte(char c) { return (static_cast<unsigned char>(c) & 0xC0) == 0x80; }
+
+// Characters, not bytes: look-behind lengths and era words are counted so.
+std::size_t characterCount(std::string_view text) {
+  return static_cast<std::size_t>(
+      std::count_if(text.begin(), text.end(), [](char c) { return !isContinuationByte(c); }));
+}
+
+// `text` without its last character (all of its bytes).
+std::string_view withoutLastCharacter(std::string_view text) {
+  std::size_t end = text.size();
+  while (end > 0 && isContinuationByte(text[end - 1])) --end;
+  return text.substr(0, end > 0 ? end - 1 : 0);
+}
+
 std::string trimmed(std::string_view text) { return std::string(kxa_trim(text)); }
 
 std::string joinData(std::string_view year, std::string_view era) {
@@ -417,7 +432,7 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
   for (const std::string* fragment : {&bceString_, &bcString_, &adString_, &ceString_}) {
     std::vector<std::string> variants;
     allVariantsFromString(*fragment, variants);
-    for (std::string& v : variants) byLength[v.size()].push_back(std::move(v));
+    for (std::string& v : variants) byLength[characterCount(v)].push_back(std::move(v));
   }
   for (const auto& [length, variants] : byLength) {
     std::string alternation;
@@ -591,8 +606,12 @@ void KXDDateParser::allVariantsFromString(std::string_view text,
         variants.emplace_back(piece);
         continue;
       }
-      const std::size_t removed = piece.ends_with(".") ? 2 : 1;
-      if (piece.size() > removed) variants.emplace_back(piece.substr(0, piece.size() - removed));
+      // An escaped period goes with its backslash.
+      const bool period = piece.ends_with(".");
+      if (characterCount(piece) > (period ? 2u : 1u)) {
+        variants.emplace_back(period ? piece.substr(0, piece.size() - 2)
+                                     : withoutLastCharacter(piece));
+      }
     }
   }
 }

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <fstream>
 #include <sstream>
 #include <string>
@@ -11,6 +12,7 @@
 
 #include "kxacore/Extensions/KXAStringExtensions.h"
 #include "kxacore/Platform/KXALocale.h"
+#include "kxacore/Platform/KXALocalizedString.h"
 #include "kxacore/RegExp/KXCRegExpPerl.h"
 
 namespace {
@@ -72,6 +74,31 @@ TEST_F(DateParserTest, AllVariantsKeepSinglePiecesWithRepeats) {
       "B", "C", "|BC", R"(B\.)", "C", "|BC", "B", R"(C\.)", "|BC", R"(B\.)", R"(C\.)", "|BC"};
   EXPECT_EQ(variants, expected);
   for (const auto& v : variants) EXPECT_EQ(v.find('?'), std::string::npos);
+}
+
+TEST_F(DateParserTest, EraVariantsCountCharactersNotBytes) {
+  std::vector<std::string> variants;
+  KXDDateParser::allVariantsFromString("MÖ", variants);  // Turkish BC
+  EXPECT_EQ(variants, (std::vector<std::string>{"M", "MÖ"}));
+  variants.clear();
+  KXDDateParser::allVariantsFromString("Ö", variants);  // one character: no short form
+  EXPECT_EQ(variants, std::vector<std::string>{"Ö"});
+
+  // The short form M is an era variant of length 1, so "12 1850 M" is not the
+  // illegal number-year-word shape, while any other trailing letter is.
+  KXALocalizedStrings::setOverride("DateParserBC", "MÖ");
+  auto turkish = KXDDateParser::dateParser();
+  KXALocalizedStrings::resetOverrides();
+  for (const auto& p : turkish->illegalPatterns()) {
+    EXPECT_TRUE(kxa_isValidUTF8(p)) << p;
+  }
+  const auto illegal = [&turkish](const char* text) {
+    turkish->parseDate(text);
+    const auto reasons = reasonsOf(*turkish);
+    return std::find(reasons.begin(), reasons.end(), kKXDParseErrorUnknown) != reasons.end();
+  };
+  EXPECT_FALSE(illegal("12 1850 M"));
+  EXPECT_TRUE(illegal("12 1850 X"));
 }
 
 TEST_F(DateParserTest, IllegalPatternsThatCompileHoldOneLength) {
