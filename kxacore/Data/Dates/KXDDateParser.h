@@ -10,7 +10,8 @@
 //   }
 //   parser->parseDate("30 Feb 1850");
 //   parser->errorCode();             // 6: day out of range (the date is Feb 1850)
-//   parser->parseErrorString();      // "Day 30 does not exist in that month."
+//   parser->parseErrorString();      // "The day does not exist in that month."
+//   parser->errorDateString();       // "30"
 //
 // What it reads:
 //   - numbers in any of the usual orders (3.4.1901, 12/25/1850, 1850-03-12),
@@ -33,9 +34,10 @@
 //   errorCode()     the reason of the top-ranked problem, 0 when none;
 //   error()         the message of the top-ranked error (reasons 6-13);
 //   warning()       the message of the top-ranked warning (reasons 1-5);
-//   parseErrorString(), errorDateString(): message and quoted data of the
-//                   top-ranked problem; errorSeverity(): 0 none, 1 error,
-//                   2 warning (of errorCode()).
+//   parseErrorString(), errorDateString(): message and data (the part of
+//                   the text at fault) of the top-ranked problem; only the
+//                   messages of reasons 4 and 9 quote that data themselves;
+//                   errorSeverity(): 0 none, 1 error, 2 warning (of errorCode()).
 //   Warnings and the errors 6 to 10 keep the date (the offending part is
 //   dropped: "32 Mar 1850" is March 1850 with reason 6). Reasons 11 (range),
 //   12 (unreadable shape) and 13 (text left over) mean there is no date.

@@ -489,9 +489,22 @@ TEST(ParseDataTest, SeverityAndMessages) {
   EXPECT_EQ(KXDParseErrorSeverity(0), 0);
   for (int r = 1; r <= 5; ++r) EXPECT_EQ(KXDParseErrorSeverity(r), 2);
   for (int r = 6; r <= 14; ++r) EXPECT_EQ(KXDParseErrorSeverity(r), 1);
-  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(6, "32", false).message(),
-            "Day 32 does not exist in that month.");
   EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(14, "x", false).message(), "");
+  // Only the future-date and leap-year messages quote the data; the other
+  // texts stand alone, so they must not hold a placeholder either.
+  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(9, "1851", false).message(),
+            "1851 is not a leap year: February has no 29th day.");
+  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(4, "5000", false).message(),
+            "The date \"5000\" lies in the future.");
+  for (int r = 1; r <= 13; ++r) {
+    if (r == 4 || r == 9) continue;
+    const std::string message = KXDParseErrorInfo::errorInfoWithReason(r, "Q7", false).message();
+    EXPECT_EQ(message, KXALocalizedString(KXDParseErrorMessageKey(r))) << r;
+    EXPECT_EQ(message.find("Q7"), std::string::npos) << r;
+    EXPECT_EQ(message.find('%'), std::string::npos) << r;
+  }
+  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(6, "32", false).message(),
+            "The day does not exist in that month.");
 }
 
 struct ErrorCase {
