@@ -41,7 +41,7 @@ TEST(DateParseCliTest, FailureGivesNullRecordAndTheMessage) {
   EXPECT_EQ(object["errorCode"], 13);
   EXPECT_EQ(object["severity"], 1);
   EXPECT_EQ(object["errorText"], "hello");
-  EXPECT_EQ(object["message"], "\"hello\" holds text that is not part of a date.");
+  EXPECT_EQ(object["message"], "The text holds words that are not part of a date.");
 }
 
 TEST(DateParseCliTest, OptionsSetTheParserSettings) {

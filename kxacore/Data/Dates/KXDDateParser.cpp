@@ -214,6 +214,21 @@ bool mayFoldToAscii(std::string_view text) {
 
 bool isKeywordCode(std::int64_t code) { return (code & kKXDEnumerationFlag) != 0; }
 
+bool isContinuationByte(char c) { return (static_cast<unsigned char>(c) & 0xC0) == 0x80; }
+
+// Characters, not bytes: look-behind lengths and era words are counted so.
+std::size_t characterCount(std::string_view text) {
+  return static_cast<std::size_t>(
+      std::count_if(text.begin(), text.end(), [](char c) { return !isContinuationByte(c); }));
+}
+
+// `text` without its last character (all of its bytes).
+std::string_view withoutLastCharacter(std::string_view text) {
+  std::size_t end = text.size();
+  while (end > 0 && isContinuationByte(text[end - 1])) --end;
+  return text.substr(0, end > 0 ? end - 1 : 0);
+}
+
 std::string trimmed(std::string_view text) { return std::string(kxa_trim(text)); }
 
 std::string joinData(std::string_view year, std::string_view era) {
@@ -317,8 +332,7 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
                                         KXALocale::shortMonthNames(code));
   }
 
-  // Qualifier words; "wft est" is accepted and dropped, and so is the GEDCOM
-  // "int" (an interpreted date: the date itself is what we keep).
+  // Qualifier words; "wft est" is accepted and dropped.
   const auto addWords = [&im](std::string_view list, std::uint64_t value) {
     for (const std::string_view piece : kxa_split(list, ",")) {
       const auto it = std::find_if(im.words.begin(), im.words.end(),
@@ -342,7 +356,6 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
   addWords(KXALocalizedString("DateParserCalculated"), kKXDModifierCalculated);
   addWords(KXALocalizedString("DateParserBetween"), 0);
   addWords("wft est", 0);
-  addWords(KXALocalizedString("DateParserInterpreted"), 0);
 
   // Era and quarter fragments.
   bcString_ = punctuatedRegExpStringFromString(KXALocalizedString("DateParserBC"), false);
@@ -419,7 +432,7 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
   for (const std::string* fragment : {&bceString_, &bcString_, &adString_, &ceString_}) {
     std::vector<std::string> variants;
     allVariantsFromString(*fragment, variants);
-    for (std::string& v : variants) byLength[v.size()].push_back(std::move(v));
+    for (std::string& v : variants) byLength[characterCount(v)].push_back(std::move(v));
   }
   for (const auto& [length, variants] : byLength) {
     std::string alternation;
@@ -593,8 +606,12 @@ void KXDDateParser::allVariantsFromString(std::string_view text,
         variants.emplace_back(piece);
         continue;
       }
-      const std::size_t removed = piece.ends_with(".") ? 2 : 1;
-      if (piece.size() > removed) variants.emplace_back(piece.substr(0, piece.size() - removed));
+      // An escaped period goes with its backslash.
+      const bool period = piece.ends_with(".");
+      if (characterCount(piece) > (period ? 2u : 1u)) {
+        variants.emplace_back(period ? piece.substr(0, piece.size() - 2)
+                                     : withoutLastCharacter(piece));
+      }
     }
   }
 }
@@ -695,7 +712,8 @@ struct KXDDateParser::Steps {
         case KXDDateParserTreatment::kNo:
           break;
         case KXDDateParserTreatment::kUnset:
-          data.addError(kKXDParseErrorTwoDigitYear, joinData(y, era));
+          // Untrimmed, unlike reasons 2 and 8: without an era it ends in a blank.
+          data.addError(kKXDParseErrorTwoDigitYear, KXAStringWithFormat("%@ %@", y, era));
           break;
       }
     } else if (y.size() == 1) {

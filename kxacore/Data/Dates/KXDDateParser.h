@@ -10,7 +10,8 @@
 //   }
 //   parser->parseDate("30 Feb 1850");
 //   parser->errorCode();             // 6: day out of range (the date is Feb 1850)
-//   parser->parseErrorString();      // "Day 30 does not exist in that month."
+//   parser->parseErrorString();      // "The day does not exist in that month."
+//   parser->errorDateString();       // "30"
 //
 // What it reads:
 //   - numbers in any of the usual orders (3.4.1901, 12/25/1850, 1850-03-12),
@@ -18,8 +19,9 @@
 //     Italian, Swedish and Spanish (12 März 1850, 3 juillet 1789), quarters
 //     (Mar Qtr 1850), dual years (1750/51), eras (BC, BCE, AD, CE);
 //   - a qualifier word in front: before/bef, after/aft, about/abt/circa/ca/c/
-//     est ..., calculated/cal, between/bet (no qualifier), "wft est" and the
-//     GEDCOM "int" (interpreted; accepted and dropped, no qualifier);
+//     est ..., calculated/cal, between/bet (no qualifier), "wft est"
+//     (accepted and dropped, no qualifier); no other word is a qualifier, so
+//     the GEDCOM "INT 1850" reads "INT" as an unknown month (reason 7);
 //   - ranges: "bet 1800 and 1810", "from 1800 to 1810", "1800-1810",
 //     "3 Mar - 5 Apr 1900" (the year is copied to the half that lacks it);
 //     the two ends always come back in ascending order;
@@ -32,9 +34,10 @@
 //   errorCode()     the reason of the top-ranked problem, 0 when none;
 //   error()         the message of the top-ranked error (reasons 6-13);
 //   warning()       the message of the top-ranked warning (reasons 1-5);
-//   parseErrorString(), errorDateString(): message and quoted data of the
-//                   top-ranked problem; errorSeverity(): 0 none, 1 error,
-//                   2 warning (of errorCode()).
+//   parseErrorString(), errorDateString(): message and data (the part of
+//                   the text at fault) of the top-ranked problem; only the
+//                   messages of reasons 4 and 9 quote that data themselves;
+//                   errorSeverity(): 0 none, 1 error, 2 warning (of errorCode()).
 //   Warnings and the errors 6 to 10 keep the date (the offending part is
 //   dropped: "32 Mar 1850" is March 1850 with reason 6). Reasons 11 (range),
 //   12 (unreadable shape) and 13 (text left over) mean there is no date.
@@ -153,7 +156,7 @@ class KXDDateParser {
   // Every problem, ranked.
   [[nodiscard]] const std::vector<KXDParseErrorInfo>& errors() const { return errors_; }
   // The value of the qualifier word found in front (1 before, 2 after,
-  // 3 about, 0x100 calculated; 0 for none, between, "wft est" and "int").
+  // 3 about, 0x100 calculated; 0 for none, between and "wft est").
   [[nodiscard]] std::uint64_t qualifier() const { return qualifier_; }
   // The record codes found (0 = none); kept even when date() is nullopt.
   [[nodiscard]] std::int64_t firstDateCode() const { return firstCode_; }

@@ -37,7 +37,12 @@ int KXDParseErrorSeverity(int reason) noexcept {
 std::string KXDParseErrorInfo::message() const {
   const std::string_view key = KXDParseErrorMessageKey(reason_);
   if (key.empty()) return {};
-  return KXAStringWithFormat(KXALocalizedString(key), data_);
+  std::string text = KXALocalizedString(key);
+  // Only these two messages quote the text; the others stand alone.
+  if (reason_ == kKXDParseErrorFutureDate || reason_ == kKXDParseErrorNotLeapYear) {
+    return KXAStringWithFormat(text, data_);
+  }
+  return text;
 }
 
 void KXDParseData::addError(int reason, std::string data) {

@@ -33,8 +33,8 @@ inline constexpr int kKXDParseErrorRange = 11;
 inline constexpr int kKXDParseErrorUnknown = 12;
 inline constexpr int kKXDParseErrorUnknownContent = 13;
 
-// The string-table key of a reason's message format (one %@ for the data);
-// empty for any other reason.
+// The string-table key of a reason's message; empty for any other reason.
+// Only the messages of reasons 4 and 9 are formats (one %@ for the data).
 [[nodiscard]] std::string_view KXDParseErrorMessageKey(int reason) noexcept;
 // 0 for reason 0, 2 for reasons 1 to 5, 1 above 5 (also for unknown reasons).
 [[nodiscard]] int KXDParseErrorSeverity(int reason) noexcept;
@@ -51,7 +51,8 @@ class KXDParseErrorInfo {
   [[nodiscard]] int reason() const noexcept { return reason_; }
   [[nodiscard]] const std::string& data() const noexcept { return data_; }
   [[nodiscard]] bool secondDateError() const noexcept { return secondDateError_; }
-  // The localised message: the reason's format with data() filled in.
+  // The localised message of the reason; reasons 4 (future date) and 9
+  // (not a leap year) have data() filled in, the others do not quote it.
   [[nodiscard]] std::string message() const;
 
   friend bool operator==(const KXDParseErrorInfo&, const KXDParseErrorInfo&) = default;

@@ -2,14 +2,17 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <fstream>
 #include <sstream>
 #include <string>
 #include <type_traits>
+#include <utility>
 #include <vector>
 
 #include "kxacore/Extensions/KXAStringExtensions.h"
 #include "kxacore/Platform/KXALocale.h"
+#include "kxacore/Platform/KXALocalizedString.h"
 #include "kxacore/RegExp/KXCRegExpPerl.h"
 
 namespace {
@@ -71,6 +74,31 @@ TEST_F(DateParserTest, AllVariantsKeepSinglePiecesWithRepeats) {
       "B", "C", "|BC", R"(B\.)", "C", "|BC", "B", R"(C\.)", "|BC", R"(B\.)", R"(C\.)", "|BC"};
   EXPECT_EQ(variants, expected);
   for (const auto& v : variants) EXPECT_EQ(v.find('?'), std::string::npos);
+}
+
+TEST_F(DateParserTest, EraVariantsCountCharactersNotBytes) {
+  std::vector<std::string> variants;
+  KXDDateParser::allVariantsFromString("MÖ", variants);  // Turkish BC
+  EXPECT_EQ(variants, (std::vector<std::string>{"M", "MÖ"}));
+  variants.clear();
+  KXDDateParser::allVariantsFromString("Ö", variants);  // one character: no short form
+  EXPECT_EQ(variants, std::vector<std::string>{"Ö"});
+
+  // The short form M is an era variant of length 1, so "12 1850 M" is not the
+  // illegal number-year-word shape, while any other trailing letter is.
+  KXALocalizedStrings::setOverride("DateParserBC", "MÖ");
+  auto turkish = KXDDateParser::dateParser();
+  KXALocalizedStrings::resetOverrides();
+  for (const auto& p : turkish->illegalPatterns()) {
+    EXPECT_TRUE(kxa_isValidUTF8(p)) << p;
+  }
+  const auto illegal = [&turkish](const char* text) {
+    turkish->parseDate(text);
+    const auto reasons = reasonsOf(*turkish);
+    return std::find(reasons.begin(), reasons.end(), kKXDParseErrorUnknown) != reasons.end();
+  };
+  EXPECT_FALSE(illegal("12 1850 M"));
+  EXPECT_TRUE(illegal("12 1850 X"));
 }
 
 TEST_F(DateParserTest, IllegalPatternsThatCompileHoldOneLength) {
@@ -328,9 +356,31 @@ INSTANTIATE_TEST_SUITE_P(
                       QualifierCase{"c1650", 3, 1650}, QualifierCase{"EST 1850", 3, 1850},
                       QualifierCase{"BEF 1850", 1, 1850}, QualifierCase{"Before: 1850", 1, 1850},
                       QualifierCase{"AFT 1850", 2, 1850}, QualifierCase{"CAL 1850", 0x100, 1850},
-                      QualifierCase{"calc. 1850", 0x100, 1850}, QualifierCase{"INT 1850", 0, 1850},
+                      QualifierCase{"calc. 1850", 0x100, 1850}, QualifierCase{"btw 1850", 0, 1850},
                       QualifierCase{"wft est 1850", 0, 1850}, QualifierCase{"WFT EST 1850", 0, 1850},
                       QualifierCase{"1850", 0, 1850}));
+
+TEST_F(DateParserTest, QualifierTableHoldsTheLocalisedWordsThenWftEst) {
+  using Words = std::vector<std::pair<std::string, std::uint64_t>>;
+  Words expected;
+  const auto add = [&expected](std::initializer_list<const char*> words, std::uint64_t value) {
+    for (const char* w : words) expected.emplace_back(w, value);
+  };
+  add({"before", "bef"}, 1);
+  add({"about", "abt", "circa", "ca", "c", "approx", "approximately", "around", "est",
+       "estimated"},
+      3);
+  add({"after", "aft"}, 2);
+  add({"calculated", "calc", "cal"}, 0x100);
+  add({"between", "bet", "btw"}, 0);
+  add({"wft est"}, 0);
+  EXPECT_EQ(parser->wordsToQualifier(), expected);
+  // Nothing else is a qualifier: GEDCOM's INT is read as a month word.
+  EXPECT_TRUE(parser->parseDate("INT 1850"));
+  EXPECT_EQ(parser->qualifier(), 0u);
+  EXPECT_EQ(parser->errorCode(), kKXDParseErrorMonthOutOfRange);
+  EXPECT_EQ(parser->errorDateString(), "INT");
+}
 
 TEST_F(DateParserTest, QualifierNeedsDigitBlankOrColonAfterIt) {
   parser->parseDate("abtx 1850");
@@ -439,9 +489,22 @@ TEST(ParseDataTest, SeverityAndMessages) {
   EXPECT_EQ(KXDParseErrorSeverity(0), 0);
   for (int r = 1; r <= 5; ++r) EXPECT_EQ(KXDParseErrorSeverity(r), 2);
   for (int r = 6; r <= 14; ++r) EXPECT_EQ(KXDParseErrorSeverity(r), 1);
-  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(6, "32", false).message(),
-            "Day 32 does not exist in that month.");
   EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(14, "x", false).message(), "");
+  // Only the future-date and leap-year messages quote the data; the other
+  // texts stand alone, so they must not hold a placeholder either.
+  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(9, "1851", false).message(),
+            "1851 is not a leap year: February has no 29th day.");
+  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(4, "5000", false).message(),
+            "The date \"5000\" lies in the future.");
+  for (int r = 1; r <= 13; ++r) {
+    if (r == 4 || r == 9) continue;
+    const std::string message = KXDParseErrorInfo::errorInfoWithReason(r, "Q7", false).message();
+    EXPECT_EQ(message, KXALocalizedString(KXDParseErrorMessageKey(r))) << r;
+    EXPECT_EQ(message.find("Q7"), std::string::npos) << r;
+    EXPECT_EQ(message.find('%'), std::string::npos) << r;
+  }
+  EXPECT_EQ(KXDParseErrorInfo::errorInfoWithReason(6, "32", false).message(),
+            "The day does not exist in that month.");
 }
 
 struct ErrorCase {
@@ -478,6 +541,9 @@ INSTANTIATE_TEST_SUITE_P(
         ErrorCase{"13 1850", 7, "13", false}, ErrorCase{"xyz 1850", 7, "xyz", true},
         ErrorCase{"13/5/1850", 13, "13/5/1850", false}, ErrorCase{"7000", 8, "7000", true},
         ErrorCase{"5 1850", 0, "", true}, ErrorCase{"5 1", 2, "1", true},
+        // Two-digit years quote year and era untrimmed; one-digit ones trimmed.
+        ErrorCase{"12 Jun 99", 1, "99 ", true}, ErrorCase{"Jun 45 AD", 1, "45 AD", true},
+        ErrorCase{"5 1 AD", 2, "1 AD", true},
         ErrorCase{"5000", 4, "5000", true}, ErrorCase{"1850 CE", 5, "1850 CE", true},
         ErrorCase{"1850 AD", 0, "", true}, ErrorCase{"12 1850 abc", 13, "12 1850 abc", false},
         ErrorCase{"5 1850 Mar", 12, "5 1850 Mar", false},
