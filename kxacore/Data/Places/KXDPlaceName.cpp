@@ -40,6 +40,20 @@ class RecordScanner {
     return text_.substr(pos, end - pos);
   }
 
+  // separator code "/" lat "/" lon, ending the record. A missing number is
+  // fine as long as the separator after it is there; the longitude may be
+  // missing at the very end.
+  bool scanNumbers(std::string_view separator, std::int64_t& code, float& latitude,
+                   float& longitude) noexcept {
+    if (!scanString(separator)) return false;
+    static_cast<void>(scanInteger(code));
+    if (!scanString("/")) return false;
+    static_cast<void>(scanFloat(latitude));
+    if (!scanString("/")) return false;
+    static_cast<void>(scanFloat(longitude));
+    return isAtEnd();
+  }
+
   bool scanInteger(std::int64_t& value) noexcept {
     const std::size_t pos = skipped();
     KXAScanner integer(text_.substr(pos));
@@ -249,15 +263,7 @@ bool KXDPlaceName::decodeStructured(std::string_view record) {
     first = false;
     store(scanner.scanUpTo('/'), *level);
   }
-  // A missing number is fine as long as its "/" follows; the longitude may
-  // be missing at the end.
-  if (!scanner.scanString("/")) return false;
-  static_cast<void>(scanner.scanInteger(code_));
-  if (!scanner.scanString("/")) return false;
-  static_cast<void>(scanner.scanFloat(latitude_));
-  if (!scanner.scanString("/")) return false;
-  static_cast<void>(scanner.scanFloat(longitude_));
-  return scanner.isAtEnd();
+  return scanner.scanNumbers("/", code_, latitude_, longitude_);
 }
 
 // "/" rawText "|" code "/" lat "/" lon, read from the start of the record.
@@ -265,13 +271,7 @@ bool KXDPlaceName::decodeFreeText(std::string_view record) {
   RecordScanner scanner(record);
   if (!scanner.scanString("/")) return false;
   store(scanner.scanUpTo('|'), rawText_);
-  if (!scanner.scanString("|")) return false;
-  static_cast<void>(scanner.scanInteger(code_));
-  if (!scanner.scanString("/")) return false;
-  static_cast<void>(scanner.scanFloat(latitude_));
-  if (!scanner.scanString("/")) return false;
-  static_cast<void>(scanner.scanFloat(longitude_));
-  return scanner.isAtEnd();
+  return scanner.scanNumbers("|", code_, latitude_, longitude_);
 }
 
 std::string KXDPlaceName::encode() const {
