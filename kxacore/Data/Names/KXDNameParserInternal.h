@@ -2,6 +2,7 @@
 // of the library's interface: tests and fuzzers reach in here.
 #pragma once
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <string>
@@ -71,6 +72,15 @@ inline constexpr std::array<std::string_view, 157> kTitleFragments{
     R"(Lieut(enant)?)", R"(Generaal)", R"(Gen(eral)?)", R"(Rev(erend)?)", R"((Cmdr|Commander))",
     R"(Capt(ain)?)", R"(Col(onel)?)", R"(Sir)", R"(Wg[\. ]+Cdr)",
 };
+
+// An entry dropped from a list would leave an empty one at its end, and an
+// empty fragment or particle matches everything.
+inline constexpr auto isEmptyEntry = [](std::string_view entry) { return entry.empty(); };
+static_assert(std::ranges::none_of(kNameSuffixes, isEmptyEntry));
+static_assert(std::ranges::none_of(kRomanNumerals, isEmptyEntry));
+static_assert(std::ranges::none_of(kFamilyParticles, isEmptyEntry));
+static_assert(std::ranges::none_of(kLastPartWords, isEmptyEntry));
+static_assert(std::ranges::none_of(kTitleFragments, isEmptyEntry));
 
 // Index of the first title expression that matches `name`, or -1. With
 // `byInitial` only the expressions that can start with the name's first

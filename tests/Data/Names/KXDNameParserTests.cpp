@@ -7,6 +7,7 @@
 #include <string>
 #include <thread>
 #include <type_traits>
+#include <utility>
 #include <vector>
 
 #include "kxacore/Data/Names/KXDNameParserInternal.h"
@@ -89,6 +90,8 @@ INSTANTIATE_TEST_SUITE_P(Parentheses, NameShapeTest, testing::Values(
     NameCase{"John (Johnny) Paul Smith", "", "John (Johnny) Paul", "Smith", "Johnny", "", 8},
     // Nothing before and no suffix after: read as plain words instead.
     NameCase{"(Johnny) Paul Smith", "", "(Johnny) Paul", "Smith", "", "", 0},
+    // A numeral cut from the words counts as a suffix found there.
+    NameCase{"(Johnny) Paul Smith III", "", "(Johnny) Paul", "Smith", "Johnny", "III", 8},
     // A second opening parenthesis makes the rest family and suffix at once.
     NameCase{"John (Smith) (Jones", "", "John", "(Jones", "", "(Jones", 0},
     // A quoted nickname is found first and wins.
@@ -153,6 +156,29 @@ INSTANTIATE_TEST_SUITE_P(Titles, NameShapeTest, testing::Values(
     NameCase{" Dr. John Smith", "", "Dr. John", "Smith", "", "", 0},
     NameCase{"Dr.", "Dr.", "", "Dr.", "", "", 4}));
 
+// Entries whose exact form decides: a required ending, an optional word
+// that leaves the separator in the title, a compound listed before or after
+// its short form.
+INSTANTIATE_TEST_SUITE_P(TitleVocabulary, NameShapeTest, testing::Values(
+    NameCase{"Madam Curie", "", "Madam", "Curie", "", "", 0},
+    NameCase{"Madame Curie", "Madame", "Madame", "Curie", "", "", 4},
+    NameCase{"First Lieut Smith", "", "First Lieut", "Smith", "", "", 0},
+    NameCase{"First Lieutenant Smith", "First Lieutenant", "First Lieutenant", "Smith", "", "",
+             4},
+    NameCase{"Puan Aminah", "Puan ", "Puan", "Aminah", "", "", 4},
+    NameCase{"Puan Sri Aminah", "Puan Sri", "Puan Sri", "Aminah", "", "", 4},
+    NameCase{"Datuk Seri Najib", "Datuk", "Datuk Seri", "Najib", "", "", 4},
+    NameCase{"Dott. sa Bianchi", "Dott. sa", "Dott. sa", "Bianchi", "", "", 4},
+    NameCase{"Tan Sri Dato Ali", "Tan Sri Dato", "Tan Sri Dato", "Ali", "", "", 4},
+    NameCase{"Rev. Dr. King", "Rev. Dr.", "Rev. Dr.", "King", "", "", 4},
+    NameCase{"Contessa Rossi", "Contessa", "Contessa", "Rossi", "", "", 4},
+    NameCase{"Sig.ra Rossi", "Sig.ra", "Sig.ra", "Rossi", "", "", 4},
+    NameCase{"Dra. Ana Lopez", "Dra.", "Dra. Ana", "Lopez", "", "", 4},
+    NameCase{"Hra Jansen", "Hra", "Hra", "Jansen", "", "", 4},
+    // Initials that spell a title are one.
+    NameCase{"M. R. James", "M. R.", "M. R.", "James", "", "", 4},
+    NameCase{"Enrique Smith", "", "Enrique", "Smith", "", "", 0}));
+
 // Suffixes are listed in vocabulary order, a numeral ending the name first.
 INSTANTIATE_TEST_SUITE_P(Suffixes, NameShapeTest, testing::Values(
     NameCase{"John Smith Jr.", "", "John", "Smith", "", "Jr.", 0},
@@ -176,6 +202,9 @@ INSTANTIATE_TEST_SUITE_P(RomanNumerals, NameShapeTest, testing::Values(
     NameCase{"Pope Pius XII", "", "Pope", "Pius", "", "XII", 0},
     NameCase{"John Smith,III", "", "John", "Smith", "", "III", 0},
     NameCase{"Jo V", "", "", "Jo", "", "V", 0},
+    // Only a dropped comma trims: a tab left by the period-and-space trim
+    // hides the numeral, and the word ends as the family.
+    NameCase{"John Smith III\t", "", "John Smith", "III", "", "", 0},
     NameCase{"II", "", "", "II", "", "", 0}));
 
 INSTANTIATE_TEST_SUITE_P(NickNames, NameShapeTest, testing::Values(
@@ -294,6 +323,42 @@ TEST(KXDNameParserVocabularyTest, TitlesKeepTheirOrderAndDuplicates) {
   };
   EXPECT_LT(position("Dr"), position("Dr[\\. ]+Ing"));
   EXPECT_LT(position("Prof(essor)?[\\. ]+Dr"), position("Prof(essor)?"));
+}
+
+TEST(KXDNameParserVocabularyTest, ParticlesPullTheNextWordIntoTheFamily) {
+  KXDNameParser parser;
+  for (const char* particle :
+       {"o'", "d'", "van", "von", "ver", "st.", "saint", "der", "de", "la", "del", "las", "te",
+        "ten", "ter", "le", "du", "des", "da", "dos", "detto", "di", "dit", "in't", "lo", "'t",
+        "tan", "uit", "den", "uyt", "vulgo", "VAN", "Saint", "DOS"}) {
+    parser.parseName(std::string("Jan ") + particle + " Berg");
+    EXPECT_EQ(parser.family(), std::string(particle) + " Berg") << particle;
+    EXPECT_EQ(parser.given(), "Jan") << particle;
+  }
+  for (const char* word : {"y", "e", "zu", "af", "bin", "ibn", "dela", "d", "o", "t", "st"}) {
+    parser.parseName(std::string("Jan ") + word + " Berg");
+    EXPECT_EQ(parser.family(), "Berg") << word;
+  }
+}
+
+TEST(KXDNameParserVocabularyTest, SuffixesAreFoundAsWritten) {
+  KXDNameParser parser;
+  // {ending, suffix}: the period is optional where the vocabulary says so.
+  const std::pair<const char*, const char*> cases[] = {
+      {"Jr", "Jr"},       {"Sr.", "Sr."},     {"PhD.", "PhD."},   {"M.D.", "M.D."},
+      {"MD", "MD"},       {"M.D", "M.D"},     {"Esq", "Esq"},     {"CD", "CD"},
+      {"CD.", "CD"},      {"CPA.", "CPA."},   {"JD", "JD"},       {"DC.", "DC."},
+      {"DDS", "DDS"},     {"DMD.", "DMD."},   {"DVM", "DVM"},     {"OD.", "OD."},
+      {"EdD", "EdD"},     {"PE.", "PE."},     {"MBA", "MBA"},     {"RN.", "RN."},
+      {"TTEE", "TTEE"},   {"ttee.", "ttee."}, {"Jnr", ""},        {"MA", ""},
+      {"Ed", ""},         {"DD", ""},         {"M D", ""}};
+  for (const auto& [ending, suffix] : cases) {
+    parser.parseName(std::string("Ann Lee ") + ending);
+    EXPECT_EQ(parser.suffix(), suffix) << ending;
+    if (*suffix != '\0') {
+      EXPECT_EQ(parser.family(), "Lee") << ending;
+    }
+  }
 }
 
 // The parser tries only the titles that can start with the name's first
