@@ -62,8 +62,9 @@ class KXCRegExpPerlMatch {
   // numGroups() * 3 integers, offset pairs first.
   [[nodiscard]] std::span<const int> matches() const { return matches_; }
 
-  // The bytes [start, end) of group `index`. nullopt when `index` is negative
-  // or not below numGroups(); an empty string for a group that took no part.
+  // The text of bytes [start, end) of group `index`. nullopt when `index` is
+  // negative or not below numGroups(), or when the bytes are not UTF-8 (\C
+  // can cut a character); an empty string for a group that took no part.
   [[nodiscard]] std::optional<std::string> stringForMatchAtIndex(std::int64_t index) const;
 
  private:
@@ -110,7 +111,9 @@ class KXCRegExpPerl {
 
   // True when the pattern matches somewhere in `subject`.
   [[nodiscard]] bool matchesString(std::string_view subject);
-  // True when the first match covers the whole subject ("abc" with "b*abc").
+  // True when the first match is as long as the subject ("abc" with
+  // "b*abc"). Only the length counts, and a failed search spans 0 bytes, so
+  // an empty subject is true for every pattern.
   [[nodiscard]] bool matchesFullString(std::string_view subject);
 
   // `subject` with every match replaced by `replacement`, taken literally.
