@@ -26,7 +26,8 @@
 // kMultiline is set, and look-behinds see the text before). After an empty
 // match the next search starts one UTF-8 character further on, so patterns
 // that can match the empty string terminate: "x*" replaced by "-" turns "ab"
-// into "-a-b".
+// into "-a-b". A match that ends inside a character (only \C can do that)
+// ends the scan: the rest of the subject is one unmatched piece.
 //
 // Thread safety: an object serves ONE thread at a time. Every search writes
 // the object's match data and result vector (hence the non-const members);
