@@ -63,7 +63,7 @@ std::optional<std::string> KXCRegExpMatch::stringForMatchAtIndex(std::int64_t in
   if (index < 0 || index >= numGroups_) return std::nullopt;
   const std::int64_t start = matches_[static_cast<std::size_t>(index) * 2];
   const std::int64_t end = matches_[static_cast<std::size_t>(index) * 2 + 1];
-  return std::string(kxc_internal::bytesInRange(content(), start, end));
+  return kxc_internal::decodedText(kxc_internal::bytesInRange(content(), start, end));
 }
 
 // ---------------------------------------------------------------------------

@@ -62,8 +62,10 @@ class KXCRegExpMatch {
   // 2 * numGroups() offsets: start and end of group 0, then of group 1 ...
   [[nodiscard]] std::span<const std::int64_t> matches() const { return matches_; }
 
-  // The bytes [start, end) of group `index`. nullopt when `index` is negative
-  // or not below numGroups(); an empty string for a group that took no part.
+  // The text of bytes [start, end) of group `index`. nullopt when `index` is
+  // negative or not below numGroups(), or when the bytes are not UTF-8 (in a
+  // byte-wise locale "." can take half a character); an empty string for a
+  // group that took no part.
   [[nodiscard]] std::optional<std::string> stringForMatchAtIndex(std::int64_t index) const;
 
  private:

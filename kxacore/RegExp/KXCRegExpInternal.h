@@ -3,7 +3,11 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
+#include <string>
 #include <string_view>
+
+#include "kxacore/Extensions/KXAStringExtensions.h"
 
 namespace kxc_internal {
 
@@ -16,12 +20,24 @@ namespace kxc_internal {
   return pos;
 }
 
+// True at the end of `text` and where no UTF-8 continuation byte stands.
+[[nodiscard]] inline bool isCharacterBoundary(std::string_view text, std::size_t pos) noexcept {
+  return pos >= text.size() || (static_cast<unsigned char>(text[pos]) & 0xC0) != 0x80;
+}
+
 // The bytes [start, end) of `text`; empty for a group that took no part (-1)
 // or for offsets that do not fit the text.
 [[nodiscard]] inline std::string_view bytesInRange(std::string_view text, std::int64_t start,
                                                    std::int64_t end) noexcept {
   if (start < 0 || end < start || static_cast<std::uint64_t>(end) > text.size()) return {};
   return text.substr(static_cast<std::size_t>(start), static_cast<std::size_t>(end - start));
+}
+
+// A group's text as a string, or nullopt when its bytes are not UTF-8 (a
+// group that ends inside a character): such bytes are no text.
+[[nodiscard]] inline std::optional<std::string> decodedText(std::string_view bytes) {
+  if (!kxa_isValidUTF8(bytes)) return std::nullopt;
+  return std::string(bytes);
 }
 
 }  // namespace kxc_internal

@@ -89,7 +89,7 @@ std::optional<std::string> KXCRegExpPerlMatch::stringForMatchAtIndex(std::int64_
   if (index < 0 || index >= numGroups_) return std::nullopt;
   const int start = matches_[static_cast<std::size_t>(index) * 2];
   const int end = matches_[static_cast<std::size_t>(index) * 2 + 1];
-  return std::string(kxc_internal::bytesInRange(content(), start, end));
+  return kxc_internal::decodedText(kxc_internal::bytesInRange(content(), start, end));
 }
 
 // ---------------------------------------------------------------------------
@@ -197,9 +197,6 @@ void KXCRegExpPerl::scan(std::string_view subject, Unmatched&& unmatched, Matche
   bool checked = false;
   while (pos < subject.size()) {
     if (!search(subject, pos, checked)) break;
-    // A search that returned a result has validated the UTF-8 of the whole
-    // subject; doing it again per match would make scans quadratic.
-    checked = true;
     const auto matchStart = static_cast<std::size_t>(resultVector_[0]);
     const auto matchEnd = static_cast<std::size_t>(resultVector_[1]);
     // \K can report a match that ends before it starts; never step backwards.
@@ -209,6 +206,11 @@ void KXCRegExpPerl::scan(std::string_view subject, Unmatched&& unmatched, Matche
     pieceStart = matchEnd;
     // An empty match would be found again at the same place forever.
     pos = matchEnd != matchStart ? matchEnd : kxc_internal::nextCharacter(subject, matchEnd);
+    // A search that returned a result has validated the UTF-8 of the whole
+    // subject; doing it again per match would make scans quadratic. The
+    // engine may skip that check only from a character boundary, which \C
+    // can leave behind; from inside a character the search then fails.
+    checked = kxc_internal::isCharacterBoundary(subject, pos);
   }
   if (pieceStart < subject.size()) unmatched(pieceStart, subject.size());
 }
@@ -216,10 +218,12 @@ void KXCRegExpPerl::scan(std::string_view subject, Unmatched&& unmatched, Matche
 bool KXCRegExpPerl::matchesString(std::string_view subject) { return search(subject, 0, false); }
 
 bool KXCRegExpPerl::matchesFullString(std::string_view subject) {
-  // A failed search leaves -1, -1, whose difference would equal the length
-  // of an empty subject: require the match itself.
-  return search(subject, 0, false) && resultVector_[0] == 0 &&
-         static_cast<std::size_t>(resultVector_[1]) == subject.size();
+  // Only the span of the whole-match pair counts, as it always has: a failed
+  // search leaves -1, -1, a span of 0, so an empty subject passes whatever
+  // the pattern. Callers that care test for an empty subject first.
+  static_cast<void>(search(subject, 0, false));
+  return std::int64_t{resultVector_[1]} - resultVector_[0] ==
+         static_cast<std::int64_t>(subject.size());
 }
 
 std::string KXCRegExpPerl::replaceAllMatches(std::string_view subject,

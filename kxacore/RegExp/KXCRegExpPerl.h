@@ -26,7 +26,8 @@
 // kMultiline is set, and look-behinds see the text before). After an empty
 // match the next search starts one UTF-8 character further on, so patterns
 // that can match the empty string terminate: "x*" replaced by "-" turns "ab"
-// into "-a-b".
+// into "-a-b". A match that ends inside a character (only \C can do that)
+// ends the scan: the rest of the subject is one unmatched piece.
 //
 // Thread safety: an object serves ONE thread at a time. Every search writes
 // the object's match data and result vector (hence the non-const members);
@@ -62,8 +63,9 @@ class KXCRegExpPerlMatch {
   // numGroups() * 3 integers, offset pairs first.
   [[nodiscard]] std::span<const int> matches() const { return matches_; }
 
-  // The bytes [start, end) of group `index`. nullopt when `index` is negative
-  // or not below numGroups(); an empty string for a group that took no part.
+  // The text of bytes [start, end) of group `index`. nullopt when `index` is
+  // negative or not below numGroups(), or when the bytes are not UTF-8 (\C
+  // can cut a character); an empty string for a group that took no part.
   [[nodiscard]] std::optional<std::string> stringForMatchAtIndex(std::int64_t index) const;
 
  private:
@@ -110,7 +112,9 @@ class KXCRegExpPerl {
 
   // True when the pattern matches somewhere in `subject`.
   [[nodiscard]] bool matchesString(std::string_view subject);
-  // True when the first match covers the whole subject ("abc" with "b*abc").
+  // True when the first match is as long as the subject ("abc" with
+  // "b*abc"). Only the length counts, and a failed search spans 0 bytes, so
+  // an empty subject is true for every pattern.
   [[nodiscard]] bool matchesFullString(std::string_view subject);
 
   // `subject` with every match replaced by `replacement`, taken literally.

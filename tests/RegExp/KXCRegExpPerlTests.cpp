@@ -65,8 +65,10 @@ TEST_P(KXCRegExpPerlTest, MatchesAndFullMatches) {
            Case{"b*abc", kUTF8, "abc", true, true},
            Case{"a+", kUTF8, "aaab", true, false},
            Case{"x*", kUTF8, "", true, true},
-           // A failed search's -1, -1 must not pass for an empty full match.
-           Case{"x", kUTF8, "", false, false},
+           // Only the span counts: a failed search's -1, -1 spans the 0
+           // bytes of an empty subject.
+           Case{"x", kUTF8, "", false, true},
+           Case{"x", kUTF8, "\xFF", false, false},
            Case{"ABC", KXCRegExpPerl::kCaseless, "abc", true, true},
            Case{"^b", kUTF8, "a\nb", false, false},
            Case{"^b", KXCRegExpPerl::kMultiline, "a\nb", true, false},
@@ -171,6 +173,22 @@ TEST_P(KXCRegExpPerlTest, PatternMatchesGiveByteOffsetsOfTheGroup) {
   ASSERT_NE(optional, nullptr);
   EXPECT_EQ(optional->allMatchesForString("aa", 1),
             (std::vector<KXCRegExpPatternMatch>{{"a", -1, 0}, {"a", -1, 0}}));
+}
+
+TEST_P(KXCRegExpPerlTest, SingleByteMatchesNeverYieldHalfCharacters) {
+  // \C takes one byte even in UTF mode, so a scan can stop inside a
+  // character: the search from there fails instead of reading on unchecked,
+  // and no byte of the subject is lost.
+  auto regExp = compile("\\C");
+  ASSERT_NE(regExp, nullptr);
+  EXPECT_EQ(regExp->replaceAllMatches("\xC3\xA9z", "-"), "-\xA9z");
+  const auto matches = regExp->matchesArrayForString("\xC3\xA9z");
+  ASSERT_EQ(matches.size(), 1u);
+  EXPECT_EQ(matches[0].stringForMatchAtIndex(0), std::nullopt) << "half a character is no text";
+  EXPECT_TRUE(regExp->allMatchesForString("\xC3\xA9z").empty());
+  EXPECT_TRUE(regExp->allMatchesForString("\xC3\xA9z", 0).empty());
+  // A whole character decodes.
+  EXPECT_EQ(regExp->matchForString("z\xC3\xA9")->stringForMatchAtIndex(0), "z");
 }
 
 TEST_P(KXCRegExpPerlTest, EmptyMatchesStepWholeCharacters) {

@@ -152,6 +152,16 @@ TEST(KXCRegExpTest, MatchEvaluatorSeesGroupsAndMatchesOutliveTheCall) {
   EXPECT_EQ(second.stringForMatchAtIndex(-1), std::nullopt);
 }
 
+TEST(KXCRegExpTest, GroupBytesThatAreNotUTF8AreNoText) {
+  // In a byte-wise locale "." can end a group inside a character.
+  const auto content = std::make_shared<const std::string>("\xC3\xA9x");
+  const std::int64_t offsets[] = {0, 3, 0, 1, 1, 3};
+  const KXCRegExpMatch match(content, 3, offsets);
+  EXPECT_EQ(match.stringForMatchAtIndex(0), "\xC3\xA9x");
+  EXPECT_EQ(match.stringForMatchAtIndex(1), std::nullopt);
+  EXPECT_EQ(match.stringForMatchAtIndex(2), std::nullopt);
+}
+
 TEST(KXCRegExpTest, ListsEveryMatch) {
   auto regExp = compile("ab");
   ASSERT_NE(regExp, nullptr);
