@@ -75,7 +75,7 @@ std::string literalDisplay(const KXDPlaceName& p, std::string_view format, std::
   const std::string g4 = p.geo4().value_or(""), g3 = p.geo3().value_or(""),
                     g2 = p.geo2().value_or(""), g1 = p.geo1().value_or(""),
                     cy = p.country().value_or("");
-  const bool someLevel = !g4.empty() || !g3.empty() || !g2.empty() || !g1.empty();
+  const bool someLevel = p.geo4() || p.geo3() || p.geo2() || p.geo1();
   const bool atHome = !home.empty() && p.country() && *p.country() == home && someLevel;
   if (format == "G" && atHome) return literalTidy(KXAStringWithFormat("%@, %@, %@, %@", g4, g3, g2, g1));
   if (format == "G" || format == "GC" || format == "FN") {
@@ -84,7 +84,7 @@ std::string literalDisplay(const KXDPlaceName& p, std::string_view format, std::
   if (format == "CM") {
     if (atHome) return literalTidy(KXAStringWithFormat("%@, %@, %@", g3, g2, g1));
     return literalTidy(
-        KXAStringWithFormat("%@, %@, %@, %@", g3, g2, g1, g4.empty() ? std::string() : cy));
+        KXAStringWithFormat("%@, %@, %@, %@", g3, g2, g1, p.geo4() ? cy : std::string()));
   }
   for (const std::string* level : {&g4, &g3, &g2, &g1}) {
     if (!level->empty()) return literalTidy(*level);

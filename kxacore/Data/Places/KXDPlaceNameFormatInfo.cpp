@@ -27,13 +27,12 @@ void appendJoined(std::string& out, const Fields&... fields) {
 }
 
 // The home country is left out only for a place that lies in it and has
-// some level below it; a place that is only its country keeps it.
+// some level below it; a place that is only its country keeps it. A level
+// set to "" counts as a level here, as it always has: only an absent one
+// does not.
 bool omitsHomeCountry(const KXDPlaceName& place) {
   if (!present(place.country())) return false;
-  if (!present(place.geo1()) && !present(place.geo2()) && !present(place.geo3()) &&
-      !present(place.geo4())) {
-    return false;
-  }
+  if (!place.geo1() && !place.geo2() && !place.geo3() && !place.geo4()) return false;
   // Read last: the preference store takes a lock.
   const std::string_view home = KXDPlaceNameFormatInfo::homeCountry();
   return !home.empty() && home == *place.country();
@@ -123,9 +122,9 @@ std::optional<std::string> KXDPlaceNameFormatInfo::innerStringForObject(KXDForma
     if (omitsHomeCountry(p)) {
       appendJoined(text, p.geo3(), p.geo2(), p.geo1());
     } else {
-      // The country only with a geo4: "Ohio, USA" prints "Ohio". Kept as
-      // the application has always shown it.
-      appendJoined(text, p.geo3(), p.geo2(), p.geo1(), present(p.geo4()) ? p.country() : kNone);
+      // The country only with a geo4 (even an empty one): "Ohio, USA"
+      // prints "Ohio". Kept as the application has always shown it.
+      appendJoined(text, p.geo3(), p.geo2(), p.geo1(), p.geo4() ? p.country() : kNone);
     }
   } else if (simple) {
     for (const auto* level : {&p.geo4(), &p.geo3(), &p.geo2(), &p.geo1(), &p.country()}) {

@@ -18,7 +18,10 @@
 //     it, so a place that is only "USA" prints "USA" even at home;
 //   - "CM" prints the country only when the place has a geo4 (so geo2
 //     "Ohio", country "USA" prints "Ohio" whatever the home country); the
-//     files and reports people keep depend on this, so it stays.
+//     files and reports people keep depend on this, so it stays;
+//   - in both tests a level set to "" counts (only an absent level does
+//     not), though it prints nothing: geo4 "" and country "USA" print ""
+//     under "G" at home.
 //
 // Any other format is a template of the terms cy (country) and g1 to g4
 // (the levels); everything else is literal text and an absent level prints

@@ -204,6 +204,11 @@ INSTANTIATE_TEST_SUITE_P(
                    "/////e/-7//"},
         EncodeCase{"smallest code", structured(kAbsent, kAbsent, kAbsent, kAbsent, "e", kMinCode),
                    "/////e/-9223372036854775808//"},
+        // n/2048 has exactly eleven decimals: the tie rounds to even, as printf does.
+        EncodeCase{"ten decimals round ties to even",
+                   structured(kAbsent, kAbsent, kAbsent, kAbsent, "e", 0, 1.0f / 2048,
+                              -3.0f / 2048),
+                   "/////e//0.0004882812/-0.0014648438"},
         EncodeCase{"coordinate at epsilon is written",
                    structured(kAbsent, kAbsent, kAbsent, kAbsent, "e", 0,
                               KXDPlaceName::kCoordinateEpsilon, -KXDPlaceName::kCoordinateEpsilon),
