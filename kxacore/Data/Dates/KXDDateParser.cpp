@@ -449,12 +449,14 @@ KXDDateParser::KXDDateParser() : impl_(std::make_unique<Impl>()) {
 
   im.extraRangeWords =
       KXCRegExpPerl::regExpWithPattern(KXAStringWithFormat(R"((?i)\b(%@|%@))", andWord, to));
+  // Each value is escaped whole, not split into its alternatives: a listed
+  // value then matches only itself, so a qualifier word out of place
+  // ("1850 aft") is reported as an unknown word instead of silently dropped.
+  // Words in front were already cut by the qualifier step.
   im.extraLeftovers = KXCRegExpPerl::regExpWithPattern(KXAStringWithFormat(
-      R"((?i)\b(%@|%@|%@|%@))",
-      regExpStringFromString(KXALocalizedString("DateParserBetween"), false),
-      regExpStringFromString(KXALocalizedString("DateParserRange"), false),
-      regExpStringFromString(KXALocalizedString("DateParserBefore"), false),
-      regExpStringFromString(KXALocalizedString("DateParserAfter"), false)));
+      R"((?i)\b(%@|%@|%@|%@))", escape(KXALocalizedString("DateParserBetween")),
+      escape(KXALocalizedString("DateParserRange")), escape(KXALocalizedString("DateParserBefore")),
+      escape(KXALocalizedString("DateParserAfter"))));
   const std::array<const std::string*, 4> eraFragments{&bceString_, &bcString_, &adString_,
                                                        &ceString_};
   for (std::size_t i = 0; i < eraFragments.size(); ++i) {

@@ -22,6 +22,8 @@
 //     est ..., calculated/cal, between/bet (no qualifier), "wft est"
 //     (accepted and dropped, no qualifier); no other word is a qualifier, so
 //     the GEDCOM "INT 1850" reads "INT" as an unknown month (reason 7);
+//     a qualifier word elsewhere ("1850 aft") is text left over (reason 13),
+//     while "from" is dropped wherever it stands;
 //   - ranges: "bet 1800 and 1810", "from 1800 to 1810", "1800-1810",
 //     "3 Mar - 5 Apr 1900" (the year is copied to the half that lacks it);
 //     the two ends always come back in ascending order;

@@ -114,6 +114,19 @@ TEST_F(DateParserTest, PatternTextsAreExact) {
   EXPECT_EQ(parser->patternAt(45), "(?i)(-)|(?i)(/)|(–)|(between)|(bet)|(btw)|(from)");
   EXPECT_EQ(parser->patternAt(48), "^ *(to|-|{~}|–) *$");
   EXPECT_EQ(parser->patternAt(49), R"( *(to|and|{~}|-|–|\.) *)");
+  // The patterns whose separators or era group differ from their neighbours'.
+  const std::string era = R"((B\.?C\.?E\.?|BCE|B\.?C\.?|BC|A\.?D\.?|AD|C\.?E\.?|CE))";
+  const std::pair<int, std::string> exact[] = {
+      {10, R"(\b([0-9]{3,8})[-\., ] *([0-9][0-9]?) *)" + era + R"(?\b)"},
+      {32, R"(\b([A-Za-zÄäÉéÛû]+\.?)[-/\., ]*([1-9]|[0-9][0-9]) *)" + era},
+      {33, R"(\b([A-Za-zÄäÉéÛû]+\.?)[-/\., ]*([0-9][0-9]?) *)"},
+      {34, R"(\b([0-9][0-9]?)[- \.,]+([0-9][0-9][0-9]+ */ *[0-9]+) *)" + era + "?"},
+      {36, R"(\b([0-9][0-9]?)[- \./,]+([0-9]+) *)" + era + "?"},
+      {41, R"(\b([0-9][0-9]?) *)" + era},
+      {46, R"(^ *([0-9]+)[ ./\-,]+([0-9][0-9][0-9]+)[ ./\-,]*[A-Za-zÄäÉéÛû]+\.?(?i)(?<!\b(a\.d\.)) *$)"},
+      {47, R"(^ *[0-9]+[ ./\-,]+([0-9][0-9][0-9]+)[ ./\-,]+[0-9]+ *$)"},
+  };
+  for (const auto& [number, text] : exact) EXPECT_EQ(parser->patternAt(number), text) << number;
   EXPECT_EQ(parser->patternAt(0), "");
   EXPECT_EQ(parser->patternAt(50), "");
   for (int i = 1; i <= KXDDateParser::kPatternCount; ++i) {
@@ -396,6 +409,21 @@ TEST_F(DateParserTest, QualifierAppliesToFirstDateOnly) {
   EXPECT_EQ(partsOf(parser->secondDateCode()).modifier & kKXDModifierQualifierMask, 0u);
 }
 
+// Qualifier words are cut only in front; elsewhere a listed before/after/
+// between word stays in the text and is reported, never silently dropped.
+// The range opener "from" is a single word and is removed wherever it stands.
+TEST_F(DateParserTest, QualifierWordsOutOfPlaceAreReported) {
+  for (const char* text : {"1850 aft", "1850 after", "1850 bef", "1800 btw"}) {
+    EXPECT_FALSE(parser->parseDate(text)) << text;
+    EXPECT_EQ(parser->errorCode(), kKXDParseErrorUnknownContent) << text;
+  }
+  for (const char* text : {"from 1850", "1850 from"}) {
+    ASSERT_TRUE(parser->parseDate(text)) << text;
+    EXPECT_EQ(parser->errorCode(), 0) << text;
+    EXPECT_EQ(partsOf(parser->firstDateCode()).year, 1850) << text;
+  }
+}
+
 // ---- Ranges and leftovers -------------------------------------------------
 
 struct RangeCase {
@@ -549,6 +577,18 @@ INSTANTIATE_TEST_SUITE_P(
         ErrorCase{"5 1850 Mar", 12, "5 1850 Mar", false},
         ErrorCase{"12 1850 3", 12, "12 1850 3", false}, ErrorCase{"12 1850 BC", 0, "", true},
         ErrorCase{"1 1750/51", 0, "", true}, ErrorCase{"", 0, "", false}));
+
+// Two matches of one pattern make a range; what the second match gets wrong
+// belongs to the second date, so equal reasons on both ends are both kept.
+TEST_F(DateParserTest, SecondMatchProblemsBelongToTheSecondDate) {
+  ASSERT_TRUE(parser->parseDate("12/25/99-12/25/98"));
+  EXPECT_EQ(parser->matchedPatterns(), std::vector<int>{6});
+  ASSERT_EQ(parser->errors().size(), 2u);
+  EXPECT_EQ(parser->errors()[0].data(), "99 ");
+  EXPECT_FALSE(parser->errors()[0].secondDateError());
+  EXPECT_EQ(parser->errors()[1].data(), "98 ");
+  EXPECT_TRUE(parser->errors()[1].secondDateError());
+}
 
 TEST_F(DateParserTest, CommonEraWarning) {
   KXDDateParser::setCommonEra(true);
