@@ -330,8 +330,18 @@ TEST_F(DateFormatTest, CacheKeys) {
   EXPECT_TRUE(cache->empty());
 }
 
+// With no date to read, every part is unknown: the date terms print nothing,
+// other terms stay, and nothing is tidied.
 TEST_F(DateFormatTest, OtherObjectsGetTheBaseSubstitution) {
-  EXPECT_EQ(formatter->stringForObject(std::string("x"), "Mmmm of yyyy"), "Mmmm of yyyy");
+  const std::vector<std::pair<std::string, std::string>> cases = {
+      {"Mmmm of yyyy", " of "},
+      {"mod d dd m mm Mmm Mmmm yyyy", std::string(7, ' ')},
+      {"d.m.yyyy x1, Year", ".. x1, Year"},
+      {"G", "G"},
+  };
+  for (const auto& [fmt, expected] : cases) {
+    EXPECT_EQ(formatter->stringForObject(std::string("x"), fmt), expected) << fmt;
+  }
 }
 
 // ---- Delimiter collapsing ----------------------------------------------------------------------
