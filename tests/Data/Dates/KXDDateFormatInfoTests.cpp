@@ -214,6 +214,19 @@ TEST_F(DateFormatTest, CommonEraChangeSwitchesTheAncientDateWarningOn) {
   EXPECT_TRUE(KXDDateParserSettings::isCommonEra());
 }
 
+// Only a change of notation reaches the parser: making or cloning a
+// formatter loads its era texts and leaves the parser settings alone.
+TEST_F(DateFormatTest, NewFormattersLeaveTheParserSettingsAlone) {
+  KXDDateParserSettings::setCommonEra(true);
+  KXDDateParserSettings::setAncientDateTypeWarning(false);
+  const KXDDateFormatInfo fresh;
+  const auto copy = fresh.clone();
+  EXPECT_TRUE(KXDDateParserSettings::isCommonEra());
+  EXPECT_FALSE(KXDDateParserSettings::isAncientDateTypeWarning());
+  EXPECT_FALSE(fresh.isCommonEra());
+  EXPECT_EQ(copy->stringForObject(KXDDate(-44, 0, 0)), "44 BC");
+}
+
 TEST_F(DateFormatTest, AdCutoffYear) {
   EXPECT_EQ(formatter->adCutoffYear(), 1000);
   formatter->setAdCutoffYear(2000);
