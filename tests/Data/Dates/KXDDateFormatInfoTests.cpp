@@ -139,9 +139,15 @@ INSTANTIATE_TEST_SUITE_P(
 // ---- Keyword and text dates ----------------------------------------------------------
 
 TEST_F(DateFormatTest, KeywordDatesPrintTheirKeyword) {
+  // Every number: the stored keyword numbers are fixed, so an entry out of
+  // place would silently relabel existing records.
   const std::vector<std::pair<std::int64_t, std::string>> cases = {
-      {0, "BIC"}, {9, "DNS/CAN"}, {16, "Young"}, {17, "Unknown"}, {18, "Private"},
-      {19, "Not married"}, {20, "Unknown"}, {0xFFFF, "Unknown"}};
+      {0, "BIC"},           {1, "Cancelled"},     {2, "Child"},        {3, "Cleared"},
+      {4, "Completed"},     {5, "Dead"},          {6, "Deceased"},     {7, "Done"},
+      {8, "DNS"},           {9, "DNS/CAN"},       {10, "Infant"},      {11, "Never married"},
+      {12, "Pre-1970"},     {13, "Stillborn"},    {14, "Submitted"},   {15, "Uncleared"},
+      {16, "Young"},        {17, "Unknown"},      {18, "Private"},     {19, "Not married"},
+      {20, "Unknown"},      {0xFFFF, "Unknown"}};
   for (const auto& [keyword, text] : cases) {
     const auto date = KXDDate::dateWithRecordDate(KXDDate::encodeEnumerateRecord(keyword));
     ASSERT_TRUE(date);
