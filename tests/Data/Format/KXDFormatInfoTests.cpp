@@ -186,7 +186,9 @@ TEST(KXDFormatInfoTest, ProviderCachesOnlyWhenTheReceiverHasACache) {
     EXPECT_EQ(provider.innerCalls, c.innerCalls);
     EXPECT_EQ(providerCache->size(), c.entries);
     EXPECT_TRUE(receiverCache->empty());
-    if (c.entries) EXPECT_EQ(providerCache->at("KXDFormatInfo:7:name"), "[Oslo]");
+    if (c.entries) {
+      EXPECT_EQ(providerCache->at("KXDFormatInfo:7:name"), "[Oslo]");
+    }
   }
 }
 
