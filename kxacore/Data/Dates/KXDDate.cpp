@@ -103,9 +103,12 @@ KXDDate::KXDDate() : formatter_(KXDDateFormatInfo::defaultFormatter()) {
   }
 }
 
+// Through the empty value, like every other construction, so that the
+// user's "about" label reaches the shared formatter whichever way dates are
+// made.
 KXDDate::KXDDate(std::int64_t year, std::int64_t month, std::int64_t day, std::uint64_t modifier)
-    : code_(encodeRecordWithYear(year, month, day, modifier)),
-      formatter_(KXDDateFormatInfo::defaultFormatter()) {
+    : KXDDate() {
+  code_ = encodeRecordWithYear(year, month, day, modifier);
   sortDate1_ = calculateSortDate(code_);
   decodeRecordDate(code_);
 }

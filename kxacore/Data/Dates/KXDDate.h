@@ -205,7 +205,9 @@ class KXDDate {
   // KXDDateFormatInfo::defaultFormatter() taken at construction (see
   // KXDDateFormatInfo.h for formats). All of these give "" when that
   // formatter is null, which happens for dates made after its one-shot
-  // KXDDateFormatInfo::resetDefaultFormat().
+  // KXDDateFormatInfo::resetDefaultFormat(). Making any date also hands a
+  // non-empty preference "KXADateNameFactLabelsAbout" to that formatter as
+  // the text of the "about" qualifier.
 
   // In the formatter's default format.
   [[nodiscard]] std::string stringWithGeneralFormat() const;
@@ -328,10 +330,10 @@ class KXDDate {
                                                              std::int64_t day) noexcept;
   static constexpr void advanceOneYear(MetonicInfo& info) noexcept;
 
-  // Only the factories build one. The empty value also carries the user's
-  // "about" label (preference "KXADateNameFactLabelsAbout") over to the
-  // shared formatter; the parser's KXDDate(year, month, day, modifier) skips
-  // that preference read.
+  // Only the factories and the other constructors build one. Every
+  // construction passes here, carrying the user's "about" label (preference
+  // "KXADateNameFactLabelsAbout", when non-empty) over to the shared
+  // formatter.
   KXDDate();
   void setFields(const KXDCalendarDate& date) noexcept {
     year_ = date.year;

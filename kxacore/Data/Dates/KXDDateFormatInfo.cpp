@@ -267,8 +267,10 @@ std::optional<std::string> KXDDateFormatInfo::cacheKeyForObject(KXDFormatObject 
 std::optional<std::string> KXDDateFormatInfo::replaceTerm(std::string_view term,
                                                           const std::any& contextInfo) {
   std::scoped_lock lock(mu_);
-  if (!date_) return KXDFormatInfo::replaceTerm(term, contextInfo);
-  const Parts& parts = *date_;
+  // Outside a date (another object's substitution) every part is unknown,
+  // so the date terms print nothing, as a date's missing parts do.
+  static constexpr Parts kNoDate{};
+  const Parts& parts = date_ ? *date_ : kNoDate;
   std::string text;
   if (term == kKXDFormatDateModifier) {
     appendModifier(text, parts.modifier);
@@ -287,7 +289,7 @@ std::optional<std::string> KXDDateFormatInfo::replaceTerm(std::string_view term,
   } else if (term == kKXDFormatDateYear) {
     appendFullYear(text, parts);
   } else {
-    text.assign(term);
+    return KXDFormatInfo::replaceTerm(term, contextInfo);
   }
   return text;
 }

@@ -124,15 +124,17 @@ class KXDDateFormatInfo : public KXDFormatInfo {
   // ---- KXDFormatInfo hooks ------------------------------------------------
 
   // A KXDDate: its text when it has one, else its display text. Other
-  // objects: the base substitution.
+  // objects: the base substitution, untidied, where the date terms print ""
+  // ("Mmmm of yyyy" gives " of ").
   [[nodiscard]] std::optional<std::string> innerStringForObject(KXDFormatObject object,
                                                                 std::string_view format,
                                                                 KXDFormatInfo* provider) override;
   // A KXDDate: its text, else "<code1>_<code2>" for a range, else "<code>".
   [[nodiscard]] std::optional<std::string> cacheKeyForObject(
       KXDFormatObject object) const override;
-  // The date terms above for the date being formatted; any other term (and
-  // every term outside a date formatting call) is kept as written.
+  // The date terms above for the date being formatted; any other term is
+  // kept as written. Outside a date formatting call (the substitution of an
+  // object that is not a KXDDate) the date terms print "".
   [[nodiscard]] std::optional<std::string> replaceTerm(std::string_view term,
                                                        const std::any& contextInfo) override;
 

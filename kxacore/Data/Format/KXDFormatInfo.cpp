@@ -88,6 +88,10 @@ std::optional<std::string> KXDFormatInfo::stringForObject(KXDFormatObject object
     return effective->postFormat(std::move(*inner));
   };
 
+  // The receiver's cache switches caching on; the provider's cache holds the
+  // entries. A provider without one therefore never hits, and a provider's
+  // cache is left alone by a receiver that caches nothing.
+  if (!cache_) return compute();
   // Held by value: a hook could install another cache during the call.
   const std::shared_ptr<KXDFormatCache> cache = effective->cache_;
   if (!cache) return compute();

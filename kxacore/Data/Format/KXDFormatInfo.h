@@ -98,7 +98,9 @@ class KXDFormatInfo {
   //   provider: the formatter whose hooks do the work (cacheKeyForObject,
   //     innerStringForObject, postFormat, its default format and cache);
   //     nullptr means this formatter. It is locked with the receiver and
-  //     must stay alive for the call.
+  //     must stay alive for the call. Results are cached only when both
+  //     this formatter and the provider have a cache (entries go to the
+  //     provider's).
   // nullopt only when the provider's innerStringForObject() gives none.
   [[nodiscard]] std::optional<std::string> stringForObject(
       KXDFormatObject object, std::optional<std::string_view> format = std::nullopt,

@@ -139,9 +139,15 @@ INSTANTIATE_TEST_SUITE_P(
 // ---- Keyword and text dates ----------------------------------------------------------
 
 TEST_F(DateFormatTest, KeywordDatesPrintTheirKeyword) {
+  // Every number: the stored keyword numbers are fixed, so an entry out of
+  // place would silently relabel existing records.
   const std::vector<std::pair<std::int64_t, std::string>> cases = {
-      {0, "BIC"}, {9, "DNS/CAN"}, {16, "Young"}, {17, "Unknown"}, {18, "Private"},
-      {19, "Not married"}, {20, "Unknown"}, {0xFFFF, "Unknown"}};
+      {0, "BIC"},           {1, "Cancelled"},     {2, "Child"},        {3, "Cleared"},
+      {4, "Completed"},     {5, "Dead"},          {6, "Deceased"},     {7, "Done"},
+      {8, "DNS"},           {9, "DNS/CAN"},       {10, "Infant"},      {11, "Never married"},
+      {12, "Pre-1970"},     {13, "Stillborn"},    {14, "Submitted"},   {15, "Uncleared"},
+      {16, "Young"},        {17, "Unknown"},      {18, "Private"},     {19, "Not married"},
+      {20, "Unknown"},      {0xFFFF, "Unknown"}};
   for (const auto& [keyword, text] : cases) {
     const auto date = KXDDate::dateWithRecordDate(KXDDate::encodeEnumerateRecord(keyword));
     ASSERT_TRUE(date);
@@ -212,6 +218,19 @@ TEST_F(DateFormatTest, CommonEraChangeSwitchesTheAncientDateWarningOn) {
   formatter->setCommonEra(true);
   EXPECT_TRUE(KXDDateParserSettings::isAncientDateTypeWarning());
   EXPECT_TRUE(KXDDateParserSettings::isCommonEra());
+}
+
+// Only a change of notation reaches the parser: making or cloning a
+// formatter loads its era texts and leaves the parser settings alone.
+TEST_F(DateFormatTest, NewFormattersLeaveTheParserSettingsAlone) {
+  KXDDateParserSettings::setCommonEra(true);
+  KXDDateParserSettings::setAncientDateTypeWarning(false);
+  const KXDDateFormatInfo fresh;
+  const auto copy = fresh.clone();
+  EXPECT_TRUE(KXDDateParserSettings::isCommonEra());
+  EXPECT_FALSE(KXDDateParserSettings::isAncientDateTypeWarning());
+  EXPECT_FALSE(fresh.isCommonEra());
+  EXPECT_EQ(copy->stringForObject(KXDDate(-44, 0, 0)), "44 BC");
 }
 
 TEST_F(DateFormatTest, AdCutoffYear) {
@@ -330,8 +349,18 @@ TEST_F(DateFormatTest, CacheKeys) {
   EXPECT_TRUE(cache->empty());
 }
 
+// With no date to read, every part is unknown: the date terms print nothing,
+// other terms stay, and nothing is tidied.
 TEST_F(DateFormatTest, OtherObjectsGetTheBaseSubstitution) {
-  EXPECT_EQ(formatter->stringForObject(std::string("x"), "Mmmm of yyyy"), "Mmmm of yyyy");
+  const std::vector<std::pair<std::string, std::string>> cases = {
+      {"Mmmm of yyyy", " of "},
+      {"mod d dd m mm Mmm Mmmm yyyy", std::string(7, ' ')},
+      {"d.m.yyyy x1, Year", ".. x1, Year"},
+      {"G", "G"},
+  };
+  for (const auto& [fmt, expected] : cases) {
+    EXPECT_EQ(formatter->stringForObject(std::string("x"), fmt), expected) << fmt;
+  }
 }
 
 // ---- Delimiter collapsing ----------------------------------------------------------------------

@@ -79,6 +79,10 @@ TEST_F(DateStringTest, AboutLabelPreferenceReachesTheSharedFormatter) {
   EXPECT_EQ(shared->fuzzinessText(), "circa");
   EXPECT_EQ(date->stringWithGeneralFormat(), "circa 05 Mar 1900");
 
+  // A date made from its parts carries the label over too.
+  shared->setFuzzinessText(std::nullopt);
+  EXPECT_EQ(KXDDate(1900, 3, 5, 3).stringWithGeneralFormat(), "circa 05 Mar 1900");
+
   shared->setFuzzinessText(std::nullopt);
   KXAUserDefaults::setString(kKXAPreferencesDateNameFactLabelsAboutKey, "");
   (void)KXDDate::dateWithRecordData("12345678");

@@ -162,6 +162,36 @@ TEST(KXDFormatInfoTest, CachesByClassObjectAndFormat) {
   EXPECT_EQ(cache->size(), 2u);
 }
 
+// The receiver's cache decides whether to cache at all; the entries live in
+// the provider's cache, under the receiver's class key.
+TEST(KXDFormatInfoTest, ProviderCachesOnlyWhenTheReceiverHasACache) {
+  struct Case {
+    bool receiverCache, providerCache;
+    int innerCalls;       // after formatting the same item twice
+    std::size_t entries;  // in the provider's cache
+  };
+  for (const Case& c : {Case{false, true, 2, 0}, Case{true, false, 2, 0}, Case{true, true, 1, 1}}) {
+    KXDFormatInfo receiver;
+    ItemFormatInfo provider;
+    auto receiverCache = std::make_shared<KXDFormatCache>();
+    auto providerCache = std::make_shared<KXDFormatCache>();
+    if (c.receiverCache) receiver.setCache(receiverCache);
+    if (c.providerCache) provider.setCache(providerCache);
+    const Item item{"7", "Oslo"};
+    for (int i = 0; i < 2; ++i) {
+      EXPECT_EQ(receiver.stringForObject(item, "name", &provider), "[Oslo]");
+    }
+    SCOPED_TRACE(testing::Message() << "receiver cache " << c.receiverCache << ", provider cache "
+                                    << c.providerCache);
+    EXPECT_EQ(provider.innerCalls, c.innerCalls);
+    EXPECT_EQ(providerCache->size(), c.entries);
+    EXPECT_TRUE(receiverCache->empty());
+    if (c.entries) {
+      EXPECT_EQ(providerCache->at("KXDFormatInfo:7:name"), "[Oslo]");
+    }
+  }
+}
+
 TEST(KXDFormatInfoTest, FlushForObjectDropsEveryKeyContainingIt) {
   ItemFormatInfo formatter;
   auto cache = std::make_shared<KXDFormatCache>();
