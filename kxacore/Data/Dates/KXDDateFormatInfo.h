@@ -39,8 +39,7 @@
 
 class KXDDate;
 
-// Named formats.
-inline constexpr std::string_view kKXDFormatGeneral = "G";
+// Named formats; "G" is kKXDFormatGeneral of the engine.
 inline constexpr std::string_view kKXDFormatDateStandard = "DMY";
 inline constexpr std::string_view kKXDFormatDateDMonY = "DMY";
 inline constexpr std::string_view kKXDFormatDateDMonthY = "LDMY";

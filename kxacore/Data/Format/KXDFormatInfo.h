@@ -68,8 +68,10 @@ using KXDTermsPatternCache =
 // Full cache key to display text.
 using KXDFormatCache = std::unordered_map<std::string, std::string, KXDStringHash, std::equal_to<>>;
 
-// The format every formatter falls back to.
+// The format every formatter falls back to. Dates and places both name it
+// kKXDFormatGeneral; it lives here so neither has to include the other.
 inline constexpr std::string_view kKXDFormatInfoGeneralFormat = "G";
+inline constexpr std::string_view kKXDFormatGeneral = kKXDFormatInfoGeneralFormat;
 
 class KXDFormatInfo {
  public:

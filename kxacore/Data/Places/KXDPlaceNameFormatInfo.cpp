@@ -57,7 +57,7 @@ std::unique_ptr<KXDFormatInfo> KXDPlaceNameFormatInfo::clone() const {
 std::shared_ptr<KXDPlaceNameFormatInfo> KXDPlaceNameFormatInfo::defaultFormatter() {
   // Never destroyed: places may be printed from other statics' destructors.
   static const auto& shared = *new std::shared_ptr<KXDPlaceNameFormatInfo>(
-      std::make_shared<KXDPlaceNameFormatInfo>(kKXDFormatInfoGeneralFormat));
+      std::make_shared<KXDPlaceNameFormatInfo>(kKXDFormatGeneral));
   return shared;
 }
 
@@ -97,7 +97,7 @@ std::optional<std::string> KXDPlaceNameFormatInfo::innerStringForObject(KXDForma
                                                                         std::string_view format,
                                                                         KXDFormatInfo* provider) {
   const KXDPlaceName* place = object.get<KXDPlaceName>();
-  const bool general = format == kKXDFormatInfoGeneralFormat;
+  const bool general = format == kKXDFormatGeneral;
   const bool generalWithCountry = format == kKXDPlaceNameFormatGeneralWithCountry;
   const bool common = format == kKXDPlaceNameFormatInfoCommon;
   const bool simple = format == kKXDPlaceNameFormatInfoSimple;

@@ -48,7 +48,7 @@
 
 class KXCRegExp;
 
-// Named formats. "G" (general) is the engine's kKXDFormatInfoGeneralFormat.
+// Named formats. "G" (general) is the engine's kKXDFormatGeneral.
 inline constexpr std::string_view kKXDPlaceNameFormatGeneralWithCountry = "GC";
 inline constexpr std::string_view kKXDPlaceNameFormatInfoCommon = "CM";
 inline constexpr std::string_view kKXDPlaceNameFormatInfoSimple = "SP";
@@ -115,7 +115,7 @@ static_assert(kKXDPlaceNameHomeCountries.front() == "None" &&
 
 class KXDPlaceNameFormatInfo : public KXDFormatInfo {
  public:
-  explicit KXDPlaceNameFormatInfo(std::string_view defaultFormat = kKXDFormatInfoGeneralFormat);
+  explicit KXDPlaceNameFormatInfo(std::string_view defaultFormat = kKXDFormatGeneral);
   ~KXDPlaceNameFormatInfo() override;
 
   [[nodiscard]] std::unique_ptr<KXDFormatInfo> clone() const override;
