@@ -112,6 +112,43 @@ std::vector<std::string_view> kxa_splitLines(std::string_view text) {
   return lines;
 }
 
+namespace {
+
+// Byte length of the line end starting at text[i], 0 when there is none.
+std::size_t newlineLengthAt(std::string_view text, std::size_t i) noexcept {
+  const auto byte = static_cast<unsigned char>(text[i]);
+  if (byte == '\r') return (i + 1 < text.size() && text[i + 1] == '\n') ? 2 : 1;
+  if (byte >= 0x0A && byte <= 0x0C) return 1;  // LF, VT, FF
+  if (byte == 0xC2) {  // U+0085
+    return (i + 1 < text.size() && static_cast<unsigned char>(text[i + 1]) == 0x85) ? 2 : 0;
+  }
+  if (byte == 0xE2 && i + 2 < text.size() && static_cast<unsigned char>(text[i + 1]) == 0x80) {
+    const auto last = static_cast<unsigned char>(text[i + 2]);
+    return (last == 0xA8 || last == 0xA9) ? 3 : 0;  // U+2028, U+2029
+  }
+  return 0;
+}
+
+}  // namespace
+
+std::vector<std::string_view> kxa_componentsSeparatedByNewline(std::string_view text) {
+  std::vector<std::string_view> lines;
+  std::size_t start = 0;
+  std::size_t i = 0;
+  while (i < text.size()) {
+    const std::size_t length = newlineLengthAt(text, i);
+    if (length == 0) {
+      ++i;
+      continue;
+    }
+    lines.push_back(text.substr(start, i - start));
+    i += length;
+    start = i;
+  }
+  if (start < text.size()) lines.push_back(text.substr(start));
+  return lines;
+}
+
 std::vector<std::string_view> kxa_split(std::string_view text, std::string_view separator) {
   std::vector<std::string_view> pieces;
   if (separator.empty()) {

@@ -33,6 +33,14 @@ void kxa_trimInPlace(std::string& text);
 // The views point into `text`.
 [[nodiscard]] std::vector<std::string_view> kxa_splitLines(std::string_view text);
 
+// Splits at every line end of the platform's newline set: LF, CR LF (one
+// end), lone CR, VT, FF, NEL (U+0085), LINE SEPARATOR (U+2028) and
+// PARAGRAPH SEPARATOR (U+2029); no CR is left in a line. As with
+// kxa_splitLines, a final line end adds no empty line, so a file of N
+// lines gives N pieces; an empty text gives none. Views point into `text`.
+[[nodiscard]] std::vector<std::string_view> kxa_componentsSeparatedByNewline(
+    std::string_view text);
+
 // Splits at every occurrence of `separator` (empty pieces kept, nothing
 // trimmed). An empty `text` gives one empty piece. Views point into `text`.
 [[nodiscard]] std::vector<std::string_view> kxa_split(std::string_view text,

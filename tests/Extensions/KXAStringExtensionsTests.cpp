@@ -85,6 +85,20 @@ TEST(Split, LinesAndSeparators) {
   EXPECT_EQ(kxa_splitLines("a\nb\r\nc\rd\n"), (V{"a", "b", "c", "d"}));
   EXPECT_EQ(kxa_splitLines("\n\n"), (V{"", ""}));
   EXPECT_EQ(kxa_splitLines(""), V{});
+}
+
+TEST(KXAStringExtensions, ComponentsSeparatedByNewlineSplitsAtEveryLineEnd) {
+  using V = std::vector<std::string_view>;
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("a\nb\r\nc\rd"), (V{"a", "b", "c", "d"}));
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("a\r\n"), V{"a"});
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("a\n\r\nb"), (V{"a", "", "b"}));
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("a\r\rb"), (V{"a", "", "b"}));
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("a\u2028b\u2029c\u0085d\fe"),
+            (V{"a", "b", "c", "d", "e"}));
+  // Near misses of the multi-byte separators stay in the line.
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("\u2027\u00c2x\u202a"), V{"\u2027\u00c2x\u202a"});
+  EXPECT_EQ(kxa_componentsSeparatedByNewline("x\xe2\x80"), V{"x\xe2\x80"});
+  EXPECT_EQ(kxa_componentsSeparatedByNewline(""), V{});
   EXPECT_EQ(kxa_split("a,,b", ","), (V{"a", "", "b"}));
   EXPECT_EQ(kxa_split("", ","), V{""});
   EXPECT_EQ(kxa_split("a, b, c", ", "), (V{"a", "b", "c"}));

@@ -19,6 +19,11 @@ void registerDateCommands(CLI::App& app);
 void registerRegexCommands(CLI::App& app);
 void registerNameCommands(CLI::App& app);
 void registerPlaceCommands(CLI::App& app);
+void registerIniCommands(CLI::App& app);
+void registerBinaryCommands(CLI::App& app);
+void registerTextCommands(CLI::App& app);
+void registerLogCommands(CLI::App& app);
+void registerGedcomCommands(CLI::App& app);
 // Verbs added under "date" (registerDateCommands creates it).
 void registerDateParseCommand(CLI::App& dateCommand);
 void registerDateFormatCommand(CLI::App& dateCommand);

@@ -20,6 +20,11 @@ int main(int argc, char** argv) {
   registerRegexCommands(app);
   registerNameCommands(app);
   registerPlaceCommands(app);
+  registerIniCommands(app);
+  registerBinaryCommands(app);
+  registerTextCommands(app);
+  registerLogCommands(app);
+  registerGedcomCommands(app);
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError& error) {

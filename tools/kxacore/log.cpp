@@ -1,0 +1,5 @@
+// kxacore log: verbs over the shared logger.
+
+#include "tools/kxacore/Commands.h"
+
+void registerLogCommands(CLI::App& app) { static_cast<void>(app); }
