@@ -118,15 +118,6 @@ TEST_F(LogCliTest, LevelFromTheEnvironmentFilters) {
   EXPECT_TRUE(std::regex_match(lines[1], kFooter)) << lines[1];
 }
 
-TEST_F(LogCliTest, WithoutAFileTheLogGoesToStderr) {
-  const ScopedEnv file(kKXFLogFileKey, std::nullopt);
-  const ScopedEnv level(kKXFLogLevelKey, std::nullopt);
-  const KXACliRun run = runKxacore({"log", "write", "--source", "x.cpp:9", "hello"}, true);
-  EXPECT_EQ(run.status, 0);
-  EXPECT_NE(run.output.find(" : Logging started...\n73 ["), std::string::npos) << run.output;
-  EXPECT_NE(run.output.find("] x.cpp:9 : hello\n* ["), std::string::npos) << run.output;
-}
-
 struct BadWriteCase {
   std::vector<std::string> arguments;
   int status;
