@@ -205,7 +205,7 @@ void KXCLogger::invalidate() {
   std::shared_ptr<KXCLogger> released;
   {
     const std::scoped_lock lock(mutex_);
-    released = gLogger.resetIfHolding(this);
+    released = gLogger.take();
   }
   // `released` may be the last reference: it goes after the lock is let go.
 }
@@ -235,8 +235,7 @@ void KXCSharedLoggerSlot::store(std::shared_ptr<KXCLogger> logger) {
   // The previous logger, if this was its last reference, dies outside the lock.
 }
 
-std::shared_ptr<KXCLogger> KXCSharedLoggerSlot::resetIfHolding(const KXCLogger* logger) {
+std::shared_ptr<KXCLogger> KXCSharedLoggerSlot::take() {
   const std::scoped_lock lock(mutex_);
-  if (logger_.get() != logger) return nullptr;
   return std::move(logger_);
 }

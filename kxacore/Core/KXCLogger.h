@@ -139,9 +139,9 @@ class KXCLogger {
   void writeHeader();  // plain-text entry "Logging started..."
   void writeFooter();  // plain-text entry "Logging finished."
 
-  // Writes the footer, then, under the logger's lock, clears gLogger if it
-  // holds this logger (a logger published since stays). The caller must hold
-  // its own reference to the logger for the length of the call.
+  // Writes the footer, then, under the logger's lock, clears gLogger,
+  // whichever logger it holds: the host's "end of logging" call. The caller
+  // must hold its own reference to the logger for the length of the call.
   void invalidate();
 
   std::int64_t level() const noexcept { return level_.load(std::memory_order_relaxed); }
@@ -190,9 +190,9 @@ class KXCSharedLoggerSlot {
   [[nodiscard]] std::shared_ptr<KXCLogger> load() const;
   void store(std::shared_ptr<KXCLogger> logger);
   void reset() { store(nullptr); }
-  // Clears the slot only when it holds `logger`; returns the reference it
-  // dropped, so the caller decides where the logger dies.
-  std::shared_ptr<KXCLogger> resetIfHolding(const KXCLogger* logger);
+  // Clears the slot; returns the reference it dropped, so the caller
+  // decides where the logger dies.
+  std::shared_ptr<KXCLogger> take();
 
  private:
   mutable std::mutex mutex_;
