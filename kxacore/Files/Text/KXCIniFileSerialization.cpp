@@ -4,8 +4,7 @@
 
 #include <charconv>
 #include <cstdlib>
-#include <fstream>
-#include <iterator>
+#include <cstdio>
 #include <limits>
 #include <mutex>
 #include <optional>
@@ -18,11 +17,21 @@
 
 namespace {
 
+struct FileClose {
+  void operator()(std::FILE* file) const { std::fclose(file); }
+};
+
+// The whole file; nullopt when it cannot be opened or read (a directory
+// opens but fails on reading, and the streams would throw there).
 std::optional<std::string> readFile(const std::filesystem::path& path) {
-  std::ifstream stream(path, std::ios::binary);
-  if (!stream) return std::nullopt;
-  std::string bytes((std::istreambuf_iterator<char>(stream)), std::istreambuf_iterator<char>());
-  if (stream.bad()) return std::nullopt;
+  const std::unique_ptr<std::FILE, FileClose> file(std::fopen(path.c_str(), "rb"));
+  if (!file) return std::nullopt;
+  std::string bytes;
+  char buffer[16384];
+  while (const std::size_t n = std::fread(buffer, 1, sizeof buffer, file.get())) {
+    bytes.append(buffer, n);
+  }
+  if (std::ferror(file.get())) return std::nullopt;
   return bytes;
 }
 
