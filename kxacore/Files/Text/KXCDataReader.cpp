@@ -69,18 +69,21 @@ std::int32_t KXCDataReader::getInt32() { return static_cast<std::int32_t>(getUIn
 float KXCDataReader::getSingle() { return std::bit_cast<float>(getUInt32()); }
 
 std::int32_t KXCDataReader::get7BitEncodedInt() {
-  const std::uint64_t start = location_;
+  // Decoded straight from the buffer: the position moves only once the whole
+  // integer is there, so one cut short by the end is not half-consumed.
   std::uint32_t result = 0;
-  try {
-    for (int shift = 0; shift != 35; shift += 7) {
-      const std::uint8_t byte = getByte();
-      result |= static_cast<std::uint32_t>(byte & 0x7F) << shift;  // 5th byte: low 4 bits survive
-      if ((byte & 0x80) == 0) return static_cast<std::int32_t>(result);
+  for (std::size_t i = 0; i < 5; ++i) {
+    require(i + 1);
+    const std::uint8_t byte = bytes_[location_ + i];
+    result |= static_cast<std::uint32_t>(byte & 0x7F) << (7 * i);  // 5th byte: low 4 bits survive
+    if ((byte & 0x80) == 0) {
+      location_ += i + 1;
+      lastReadLength_ = 1;
+      return static_cast<std::int32_t>(result);
     }
-  } catch (const std::out_of_range&) {
-    location_ = start;  // an integer cut short by the end is not half-consumed
-    throw;
   }
+  location_ += 5;
+  lastReadLength_ = 1;
   return -1;
 }
 

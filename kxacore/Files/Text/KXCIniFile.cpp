@@ -1,5 +1,7 @@
 #include "kxacore/Files/Text/KXCIniFile.h"
 
+#include <nlohmann/json.hpp>
+
 #include "kxacore/Files/Text/KXCIniFileSerialization.h"
 #include "kxacore/Platform/KXAStringFormat.h"
 

@@ -30,7 +30,7 @@
 #include <string_view>
 #include <vector>
 
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>  // the "any value" of key-value coding
 
 class KXCIniSection {
  public:
