@@ -4,6 +4,7 @@
 
 #include <charconv>
 #include <cstdlib>
+#include <cstring>
 #include <cstdio>
 #include <limits>
 #include <mutex>
@@ -131,6 +132,53 @@ std::optional<std::string> plistValueText(plist_t node) {
   }
 }
 
+std::uint64_t bigEndian(const std::uint8_t* bytes, std::size_t width) {
+  std::uint64_t value = 0;
+  for (std::size_t i = 0; i < width; ++i) value = value << 8 | bytes[i];
+  return value;
+}
+
+// libplist 2.2 aborts the process (a failed assertion when a dictionary key
+// is fetched) on a binary property list whose strings hold a NUL. So every
+// string object is checked first; a list that cannot be checked is refused
+// too. XML needs no check: its parser cuts strings at a NUL consistently.
+bool binaryPlistIsSafe(std::span<const std::uint8_t> data) {
+  constexpr std::size_t kTrailerSize = 32;
+  if (data.size() < 6 || std::memcmp(data.data(), "bplist", 6) != 0) return true;
+  if (data.size() < 8 + kTrailerSize) return false;
+  const std::uint8_t* trailer = data.data() + data.size() - kTrailerSize;
+  const std::size_t offsetSize = trailer[6];
+  const std::uint64_t objectCount = bigEndian(trailer + 8, 8);
+  const std::uint64_t tableOffset = bigEndian(trailer + 24, 8);
+  if (offsetSize < 1 || offsetSize > 8 || tableOffset > data.size() ||
+      objectCount > (data.size() - tableOffset) / offsetSize) {
+    return false;
+  }
+  for (std::uint64_t i = 0; i < objectCount; ++i) {
+    const std::uint64_t offset = bigEndian(data.data() + tableOffset + i * offsetSize, offsetSize);
+    if (offset >= data.size()) return false;
+    const std::uint8_t marker = data[offset];
+    const int type = marker >> 4;  // 5: ASCII string, 6: UTF-16 string
+    if (type != 5 && type != 6) continue;
+    std::uint64_t count = marker & 0xF;
+    std::uint64_t position = offset + 1;
+    if (count == 0xF) {  // the count follows as an integer object
+      if (position >= data.size() || (data[position] >> 4) != 1) return false;
+      const std::size_t width = std::size_t{1} << (data[position] & 0xF);
+      if (width > 8 || width > data.size() - position - 1) return false;
+      count = bigEndian(data.data() + position + 1, width);
+      position += 1 + width;
+    }
+    const std::size_t unit = type == 5 ? 1 : 2;
+    if (count > (data.size() - position) / unit) return false;
+    for (std::uint64_t j = 0; j < count; ++j) {
+      const std::uint8_t* code = data.data() + position + j * unit;
+      if (code[0] == 0 && (unit == 1 || code[1] == 0)) return false;
+    }
+  }
+  return true;
+}
+
 // Calls visit(key, node) for each entry of a dictionary node.
 template <class Visit>
 void forEachEntry(plist_t dictionary, Visit&& visit) {
@@ -223,6 +271,7 @@ std::unique_ptr<KXCIniFile> KXCIniFilePropertyListSerializator::iniFromFile(
 std::unique_ptr<KXCIniFile> KXCIniFilePropertyListSerializator::iniFromData(
     std::span<const std::uint8_t> data) {
   if (data.empty() || data.size() > std::numeric_limits<std::uint32_t>::max()) return nullptr;
+  if (!binaryPlistIsSafe(data)) return nullptr;
   plist_t parsed = nullptr;
   plist_from_memory(reinterpret_cast<const char*>(data.data()),
                     static_cast<std::uint32_t>(data.size()), &parsed);

@@ -112,6 +112,56 @@ TEST(KXCIniFileNativeTest, ParsesFromSeveralThreadsAtOnce) {
   for (const std::size_t count : counts) EXPECT_EQ(count, 20u * 200u);
 }
 
+std::vector<std::uint8_t> fromHex(std::string_view hex) {
+  std::vector<std::uint8_t> bytes;
+  for (std::size_t i = 0; i + 1 < hex.size(); i += 2) {
+    bytes.push_back(static_cast<std::uint8_t>(std::stoi(std::string(hex.substr(i, 2)), nullptr, 16)));
+  }
+  return bytes;
+}
+
+struct BinaryPlistCase {
+  const char* name;
+  const char* hex;  // written by Python's plistlib, some edited by hand
+  bool readable;
+};
+
+class BinaryPlistTest : public testing::TestWithParam<BinaryPlistCase> {};
+
+// A NUL inside a binary list's string would abort the process inside
+// libplist; such lists are refused instead.
+TEST_P(BinaryPlistTest, RefusesWhatCouldAbort) {
+  const BinaryPlistCase& c = GetParam();
+  const std::vector<std::uint8_t> bytes = fromHex(c.hex);
+  EXPECT_EQ(static_cast<bool>(KXCIniFilePropertyListSerializator::iniFromData(bytes)), c.readable)
+      << c.name;
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Lists, BinaryPlistTest,
+    testing::Values(
+        BinaryPlistCase{"plain",
+                        "62706c6973743030d101025153d203040506516b516e51761003080b0d121416180000"
+                        "00000000010100000000000000070000000000000000000000000000001a",
+                        true},
+        BinaryPlistCase{"NUL in an ASCII key",
+                        "62706c6973743030d101025153d10304536100625178080b0d10140000000000000101"
+                        "000000000000000500000000000000000000000000000016",
+                        false},
+        BinaryPlistCase{"NUL in a value",
+                        "62706c6973743030d101025153d10304516b53780079080b0d10120000000000000101"
+                        "000000000000000500000000000000000000000000000016",
+                        false},
+        BinaryPlistCase{"NUL in a UTF-16 key",
+                        "62706c6973743030d101025153d1030463006b00e900005176080b0d10170000000000"
+                        "000101000000000000000500000000000000000000000000000019",
+                        false},
+        BinaryPlistCase{"offset table past the end",
+                        "62706c6973743030d101025153d10304516b5176080b0d10120000000000000101000000"
+                        "0000000005000000000000000000000000000000ff",
+                        false},
+        BinaryPlistCase{"no trailer", "62706c6973743030d10102", false}));
+
 class IniFilesTest : public testing::Test {
  protected:
   void SetUp() override {
