@@ -71,9 +71,11 @@ float KXCDataReader::getSingle() { return std::bit_cast<float>(getUInt32()); }
 std::int32_t KXCDataReader::get7BitEncodedInt() {
   // Decoded straight from the buffer: the position moves only once the whole
   // integer is there, so one cut short by the end is not half-consumed.
+  // With five bytes left no step can run past the end: check once.
+  const bool roomForAll = location_ <= size_ && size_ - location_ >= 5;
   std::uint32_t result = 0;
   for (std::size_t i = 0; i < 5; ++i) {
-    require(i + 1);
+    if (!roomForAll) require(i + 1);
     const std::uint8_t byte = bytes_[location_ + i];
     result |= static_cast<std::uint32_t>(byte & 0x7F) << (7 * i);  // 5th byte: low 4 bits survive
     if ((byte & 0x80) == 0) {
