@@ -49,7 +49,9 @@ class KXCDataReader {
   [[nodiscard]] std::uint64_t location() const { return location_; }
   // Size of the wrapped span (offset + length for the pointer constructor).
   [[nodiscard]] std::size_t size() const { return size_; }
-  // Byte count of the most recent successful getBytes.
+  // Byte count of the last step of the most recent successful read: the
+  // width of a fixed-size value, 1 after a 7-bit int, the text's bytes
+  // after a string.
   [[nodiscard]] std::size_t lastReadLength() const { return lastReadLength_; }
 
   // Copies `count` bytes to `destination` and advances. Throws

@@ -260,6 +260,21 @@ TEST_F(IniFilesTest, PropertyListValuesOfOtherKinds) {
                                {"text", "t"}}}}));
 }
 
+// Writers take each value through key-value coding, where "name" is the
+// section's own name: an entry of that name, which only a property list can
+// hold, is written as the section name.
+TEST_F(IniFilesTest, EntryNamedNameIsWrittenAsTheSectionName) {
+  write(dir_ / "name.plist",
+        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\"><dict>"
+        "<key>S1</key><dict><key>name</key><string>x</string></dict></dict></plist>");
+  const auto ini = KXCIniFile::iniWithContentsOfFile(dir_ / "name.plist", KXCIniFileFormatPropertyList);
+  ASSERT_TRUE(ini);
+  EXPECT_EQ(asJson(*ini), (J{{"S1", {{"name", "x"}}}}));
+  EXPECT_EQ(KXCIniFileNativeSerializator::stringFromIni(*ini), "[S1]\nname=S1\n");
+  const std::string xml = KXCIniFilePropertyListSerializator::xmlFromIni(*ini);
+  EXPECT_NE(xml.find("<key>name</key>\n\t\t<string>S1</string>"), std::string::npos) << xml;
+}
+
 // Python's plistlib reads what we write, and we read what it writes in both
 // of its forms.
 TEST_F(IniFilesTest, PythonPlistlibInterop) {
