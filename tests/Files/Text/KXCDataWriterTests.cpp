@@ -84,7 +84,7 @@ INSTANTIATE_TEST_SUITE_P(
         StringCase{"e acute", std::string("\xC3\xA9"), {0x02, 0xC3, 0xA9}},
         StringCase{"four-byte character", std::string("\xF0\x9F\x98\x80"),
                    {0x04, 0xF0, 0x9F, 0x98, 0x80}},
-        // Where the formats part: .NET throws on null and writes the NUL;
+        // Where the formats differ: .NET throws on null and writes the NUL;
         // this stream writes 00 for none and cuts at the NUL.
         StringCase{"none", std::nullopt, {0x00}},
         StringCase{"embedded NUL", std::string("ab\0cd", 5), {0x02, 'a', 'b'}},
