@@ -50,7 +50,6 @@ bool KXCFileLineReader::readRawLine(std::size_t& length) {
 }
 
 std::optional<std::string> KXCFileLineReader::readLine() {
-  if (!file_) return std::nullopt;
   std::size_t length = 0;
   bool readAny = false;
   try {
@@ -61,6 +60,7 @@ std::optional<std::string> KXCFileLineReader::readLine() {
   }
   if (!readAny) {
     buffer_ = {};
+    atEnd_ = true;
     return std::nullopt;
   }
   if (length > 0 && buffer_[length - 1] == '\n') {

@@ -54,9 +54,9 @@ class KXCFileLineReader {
   // read error, or when the line does not decode.
   std::optional<std::string> readLine();
 
-  // True once a read reached the end of the file: after readLine() gave
-  // nullopt, false means the line did not decode (or the read failed).
-  [[nodiscard]] bool atEndOfFile() const { return !file_ || std::feof(file_.get()) != 0; }
+  // True once readLine() found nothing left to read: after readLine() gave
+  // nullopt, false means the line did not decode (or the buffer could not grow).
+  [[nodiscard]] bool atEndOfFile() const { return atEnd_; }
 
   // Bytes the line buffer holds now (0 before the first line and after the end).
   [[nodiscard]] std::size_t bufferCapacity() const { return buffer_.size(); }
@@ -69,4 +69,5 @@ class KXCFileLineReader {
   FilePtr file_;
   std::unique_ptr<KXCTextDecoder> decoder_;
   std::vector<char> buffer_;
+  bool atEnd_ = false;
 };
