@@ -1,11 +1,14 @@
 #include "kxacore/Files/Text/KXCFileLineReader.h"
 
+#include <algorithm>
 #include <cstring>
 #include <new>
 
 namespace {
 
 constexpr std::size_t kMinimumRoom = 100;
+// Bytes read from the file at a time; lines are cut from this block.
+constexpr std::size_t kBlockSize = 1 << 16;
 
 }  // namespace
 
@@ -17,6 +20,8 @@ std::unique_ptr<KXCFileLineReader> KXCFileLineReader::withFilePath(const std::fi
   if (std::filesystem::is_directory(path, error)) return nullptr;
   FilePtr file(std::fopen(path.c_str(), "r"));
   if (!file) return nullptr;
+  // The reader keeps its own read-ahead block; a second one in stdio would only copy.
+  std::setvbuf(file.get(), nullptr, _IONBF, 0);
   return std::make_unique<KXCFileLineReader>(ConstructionToken{}, std::move(file), std::move(decoder));
 }
 
@@ -26,26 +31,31 @@ KXCFileLineReader::KXCFileLineReader(ConstructionToken, FilePtr file, std::uniqu
 KXCFileLineReader::~KXCFileLineReader() = default;
 
 bool KXCFileLineReader::readRawLine(std::size_t& length) {
-  std::FILE* const file = file_.get();
   bool readAny = false;
-  // Like fgets into the free part of the buffer, round after round, but the
-  // byte count is kept, so a NUL in the line cannot hide the rest of it.
-  flockfile(file);
   for (;;) {
-    if (buffer_.size() - length < kMinimumRoom) buffer_.resize(buffer_.size() * 2 + kMinimumRoom);
-    char* const room = buffer_.data() + length;
-    const std::size_t roomSize = buffer_.size() - length - 1;  // fgets keeps one byte for its NUL
-    std::size_t count = 0;
-    int c = 0;
-    while (count < roomSize && (c = getc_unlocked(file)) != EOF) {
-      room[count++] = static_cast<char>(c);
-      if (c == '\n') break;
+    if (blockPos_ == blockEnd_) {
+      if (block_.empty()) block_.resize(kBlockSize);
+      blockPos_ = 0;
+      blockEnd_ = std::fread(block_.data(), 1, block_.size(), file_.get());
+      if (blockEnd_ == 0) break;
     }
-    length += count;
-    readAny = readAny || count > 0;
-    if (c == '\n' || c == EOF) break;
+    const char* const start = block_.data() + blockPos_;
+    const std::size_t available = blockEnd_ - blockPos_;
+    const char* const lf = static_cast<const char*>(std::memchr(start, '\n', available));
+    std::size_t take = lf == nullptr ? available : static_cast<std::size_t>(lf - start) + 1;
+    readAny = true;
+    // Into the line buffer in the rounds a line read of the free space
+    // minus its terminator would take, so the buffer grows the same way.
+    while (take > 0) {
+      if (buffer_.size() - length < kMinimumRoom) buffer_.resize(buffer_.size() * 2 + kMinimumRoom);
+      const std::size_t count = std::min(take, buffer_.size() - length - 1);
+      std::memcpy(buffer_.data() + length, block_.data() + blockPos_, count);
+      length += count;
+      blockPos_ += count;
+      take -= count;
+    }
+    if (lf != nullptr) break;
   }
-  funlockfile(file);
   return readAny;
 }
 

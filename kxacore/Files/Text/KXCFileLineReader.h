@@ -13,8 +13,10 @@
 // KXCTextDecoder to see such lines). Byte-oriented splitting suits ASCII-based
 // encodings, ANSEL included; UTF-16 files are not split correctly.
 //
-// The line buffer is kept between calls and grows to twice its size plus 100
-// bytes whenever fewer than 100 bytes of room remain.
+// The file is read in blocks of 64 KiB, from which each line is copied into
+// a line buffer, as a C-library line read would copy it: the buffer is kept
+// between calls and grows to twice its size plus 100 bytes whenever fewer
+// than 100 bytes of room remain.
 //
 // Thread safety: one thread at a time.
 #pragma once
@@ -62,12 +64,16 @@ class KXCFileLineReader {
   [[nodiscard]] std::size_t bufferCapacity() const { return buffer_.size(); }
 
  private:
-  // Reads up to and including the next LF, appending to the buffer; false
-  // when nothing could be read. Throws std::bad_alloc when the buffer cannot grow.
+  // Copies up to and including the next LF into the line buffer, setting
+  // `length`; false when nothing was left. Throws std::bad_alloc when the
+  // buffer cannot grow.
   bool readRawLine(std::size_t& length);
 
   FilePtr file_;
   std::unique_ptr<KXCTextDecoder> decoder_;
   std::vector<char> buffer_;
+  std::vector<char> block_;  // read-ahead, cut into lines
+  std::size_t blockPos_ = 0;
+  std::size_t blockEnd_ = 0;
   bool atEnd_ = false;
 };
