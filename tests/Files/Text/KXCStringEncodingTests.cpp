@@ -71,6 +71,28 @@ INSTANTIATE_TEST_SUITE_P(
                     ANSELCase{{0xE2, 0x0D, 0x65}, kxcUTF8({0x301, '\r', 'e'})},
                     ANSELCase{{}, ""}));
 
+// Long texts cross the decoder's internal pieces and its ASCII blocks at
+// every alignment; the walk over UTF-16 units, written out literally, is the
+// oracle.
+TEST(ANSELTest, LongTextsMatchTheWalkOverUTF16Units) {
+  std::mt19937 random(1537);
+  for (const int highPercent : {1, 10, 60}) {
+    std::vector<std::uint8_t> bytes(20000);
+    for (auto& byte : bytes) {
+      byte = static_cast<int>(random() % 100) < highPercent ? static_cast<std::uint8_t>(0x80 + random() % 128)
+                                                             : static_cast<std::uint8_t>(random() % 128);
+    }
+    std::vector<char16_t> units(bytes.size());
+    for (std::size_t i = 0; i < bytes.size(); ++i) {
+      units[i] = kANSELExpected[bytes[i]];
+      if (i > 0 && isANSELMark(bytes[i - 1]) && bytes[i] != 0x0D) std::swap(units[i], units[i - 1]);
+    }
+    std::string expected;
+    for (const char16_t unit : units) expected += kxcUTF8({unit});
+    EXPECT_EQ(KXCTextFileReader::stringFromANSELData(bytes), expected) << highPercent << "% high bytes";
+  }
+}
+
 // Decoding in pieces must give the bytes of decoding whole, for every
 // encoding; random texts mix the bytes that hold state (marks, lead bytes,
 // surrogates, CR) with ordinary ones.
