@@ -435,9 +435,14 @@ using ConverterPtr = std::unique_ptr<UConverter, ConverterCloser>;
 
 class ICUDecoder final : public KXCTextDecoder {
  public:
-  explicit ICUDecoder(ConverterPtr converter) : converter_(std::move(converter)) {
+  explicit ICUDecoder(ConverterPtr converter) : converter_(std::move(converter)) {}
+
+  // Routes invalid input to substituteAndCount; false when ICU refuses, and
+  // then the decoder must not be used (it would substitute without counting).
+  bool installCallback() {
     UErrorCode status = U_ZERO_ERROR;
     ucnv_setToUCallBack(converter_.get(), &ICUDecoder::substituteAndCount, this, nullptr, nullptr, &status);
+    return U_SUCCESS(status);
   }
 
   void decode(std::span<const std::uint8_t> bytes, std::string& out) override {
@@ -557,7 +562,9 @@ std::unique_ptr<KXCTextDecoder> KXCTextDecoder::decoderForEncoding(KXCStringEnco
   UErrorCode status = U_ZERO_ERROR;
   ConverterPtr converter(ucnv_open(std::string(info->icuName).c_str(), &status));
   if (U_FAILURE(status) || !converter) return nullptr;
-  return std::make_unique<ICUDecoder>(std::move(converter));
+  auto decoder = std::make_unique<ICUDecoder>(std::move(converter));
+  if (!decoder->installCallback()) return nullptr;
+  return decoder;
 }
 
 std::span<const KXCStringEncodingInfo> KXCAvailableStringEncodings() {
