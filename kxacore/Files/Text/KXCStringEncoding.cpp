@@ -331,7 +331,7 @@ class ANSELDecoder final : public KXCTextDecoder {
     std::uint8_t held = held_;
     while (src < end) {
       const std::uint8_t* const pieceEnd = src + std::min<std::size_t>(kPieceSize, static_cast<std::size_t>(end - src));
-      char* const piece = pieceFor(src);
+      char* const piece = pieceBuffer_.get();
       char* dst = piece;
       while (src < pieceEnd) {
         if (holding) {
@@ -400,19 +400,9 @@ class ANSELDecoder final : public KXCTextDecoder {
 
   // Input bytes decoded into the piece buffer before it is appended.
   static constexpr std::size_t kPieceSize = 4096;
-  static constexpr std::size_t kPage = 4096;
-
-  // Where to decode the piece that starts at `src`: half a page away from it
-  // modulo the page size. Loads and stores whose addresses agree in their
-  // low twelve bits stall each other on common processors, and large
-  // buffers tend to agree (both start just past a page boundary).
-  char* pieceFor(const std::uint8_t* src) const {
-    const auto base = reinterpret_cast<std::uintptr_t>(pieceBuffer_.get());
-    const auto wanted = reinterpret_cast<std::uintptr_t>(src) + kPage / 2;
-    return pieceBuffer_.get() + ((wanted - base) & (kPage - 1));
-  }
-  // Room past three bytes per input byte: a step's four-byte stores and
-  // sixteen-byte copies may write a little beyond what they keep.
+  // Room past three bytes per input byte: the unit held over from the
+  // previous piece, and what four-byte stores and sixteen-byte copies write
+  // beyond the bytes they keep.
   static constexpr std::size_t kSlack = 16;
 
   static char* put(char* dst, std::uint8_t byte) {
@@ -421,7 +411,7 @@ class ANSELDecoder final : public KXCTextDecoder {
     return dst + entry.length;
   }
 
-  std::unique_ptr<char[]> pieceBuffer_ = std::make_unique_for_overwrite<char[]>(kPieceSize * 3 + kSlack + kPage);
+  std::unique_ptr<char[]> pieceBuffer_ = std::make_unique_for_overwrite<char[]>(kPieceSize * 3 + kSlack);
   std::uint8_t held_ = 0;
   bool holding_ = false;
 };
