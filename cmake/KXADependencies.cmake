@@ -7,3 +7,13 @@ find_package(ICU REQUIRED COMPONENTS uc i18n data)
 find_package(nlohmann_json REQUIRED)
 pkg_check_modules(PCRE2 REQUIRED IMPORTED_TARGET GLOBAL libpcre2-8)
 pkg_check_modules(PLIST REQUIRED IMPORTED_TARGET GLOBAL libplist-2.0)
+find_package(ZLIB REQUIRED)
+find_package(OpenSSL REQUIRED COMPONENTS Crypto)
+find_package(hwy REQUIRED)
+pkg_check_modules(MINIZIP REQUIRED IMPORTED_TARGET GLOBAL minizip)
+# minizip's own folder would make <zip.h> minizip's even where libzip's is
+# meant: the library always writes <minizip/zip.h>.
+set_property(TARGET PkgConfig::MINIZIP PROPERTY INTERFACE_INCLUDE_DIRECTORIES "")
+pkg_check_modules(LIBZIP REQUIRED IMPORTED_TARGET GLOBAL libzip)
+pkg_check_modules(CAIRO REQUIRED IMPORTED_TARGET GLOBAL cairo)
+pkg_check_modules(VIPS REQUIRED IMPORTED_TARGET GLOBAL vips-cpp)

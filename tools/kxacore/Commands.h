@@ -24,6 +24,10 @@ void registerBinaryCommands(CLI::App& app);
 void registerTextCommands(CLI::App& app);
 void registerLogCommands(CLI::App& app);
 void registerGedcomCommands(CLI::App& app);
+void registerZipCommands(CLI::App& app);
+void registerImageCommands(CLI::App& app);
+// Verb added under "zip" (registerZipCommands creates it).
+void registerZipEditCommand(CLI::App& zipCommand);
 // Verbs added under "date" (registerDateCommands creates it).
 void registerDateParseCommand(CLI::App& dateCommand);
 void registerDateFormatCommand(CLI::App& dateCommand);

@@ -49,6 +49,9 @@ int main(int argc, char** argv) {
   registerTextCommands(app);
   registerLogCommands(app);
   registerGedcomCommands(app);
+  registerZipCommands(app);
+  registerZipEditCommand(*app.get_subcommand("zip"));  // registerZipCommands made it
+  registerImageCommands(app);
   const CliLogging logging;
   try {
     app.parse(argc, argv);
