@@ -36,6 +36,7 @@ struct EventSpan {
   std::int64_t earliest = 0;
   std::int64_t latest = 0;
   std::uint64_t line = 0;
+  std::uint32_t text = 0;  // index of the date as written
   bool known = false;
 };
 
@@ -164,6 +165,21 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   std::vector<Link> links;
   std::vector<std::string> tags;  // interned tags of pending pointers
   std::unordered_set<std::string> recordTags;
+  // Dates of events as written, for messages; events share equal texts.
+  StringMap<std::uint32_t> dateTextIndex;
+  std::vector<std::string_view> dateTexts;
+
+  std::uint32_t internDateText(std::string_view text) {
+    text = kxa_trim(text);
+    if (const auto found = dateTextIndex.find(text); found != dateTextIndex.end()) return found->second;
+    const auto index = static_cast<std::uint32_t>(dateTexts.size());
+    dateTexts.push_back(dateTextIndex.emplace(std::string(text), index).first->first);
+    return index;
+  }
+
+  std::string eventText(const EventSpan& span) const {
+    return span.text < dateTexts.size() ? std::string(dateTexts[span.text]) : spanText(span);
+  }
 
   bool sawHeader = false;
   bool sawTrailer = false;
@@ -311,9 +327,8 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
                       line.tag, line.value});
     }
     if (!reading.hasSpan || self == kNone || parent == nullptr || parent->level != 1) return;
-    const EventSpan span{reading.earliest, reading.latest, line.number, true};
     const auto keep = [&](EventSpan& slot) {
-      if (!slot.known) slot = span;
+      if (!slot.known) slot = {reading.earliest, reading.latest, line.number, internDateText(line.value), true};
     };
     const std::string& event = parent->tag;
     if (kind == Kind::kIndividual) {
@@ -429,8 +444,8 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     const Kind expected = expectedKind(tag);
     if (expected == Kind::kUndefined || entry.kind == expected) return;
     emit(line, "pointer-wrong-type",
-         std::string(tag) + " points to " + std::string(value) + ", which is a " +
-             std::string(entry.tag) + " record (line " + std::to_string(entry.line) + ").",
+         std::string(tag) + " points to " + std::string(value) + ", which is the " +
+             std::string(entry.tag) + " record on line " + std::to_string(entry.line) + ".",
          tag, value);
   }
 
@@ -520,7 +535,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   }
 
   void dateFinding(const EventSpan& at, std::string_view code, std::string message) {
-    emit(at.line, code, std::move(message), "DATE", spanText(at));
+    emit(at.line, code, std::move(message), "DATE", eventText(at));
   }
 
   void checkIndividuals() {
@@ -530,25 +545,25 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
       const auto& death = person.death;
       if (birth.known && death.known && birth.earliest > death.latest) {
         dateFinding(birth, "birth-after-death",
-                    id + " is born (" + spanText(birth) + ") after dying (" + spanText(death) +
+                    id + " is born (" + eventText(birth) + ") after dying (" + eventText(death) +
                         ", line " + std::to_string(death.line) + ").");
       }
       if (birth.known && person.baptism.known && person.baptism.latest < birth.earliest) {
         dateFinding(person.baptism, "baptism-before-birth",
-                    id + " is baptised (" + spanText(person.baptism) + ") before being born (" +
-                        spanText(birth) + ", line " + std::to_string(birth.line) + ").");
+                    id + " is baptised (" + eventText(person.baptism) + ") before being born (" +
+                        eventText(birth) + ", line " + std::to_string(birth.line) + ").");
       }
       if (death.known && person.burial.known && person.burial.latest < death.earliest) {
         dateFinding(person.burial, "burial-before-death",
-                    id + " is buried (" + spanText(person.burial) + ") before dying (" +
-                        spanText(death) + ", line " + std::to_string(death.line) + ").");
+                    id + " is buried (" + eventText(person.burial) + ") before dying (" +
+                        eventText(death) + ", line " + std::to_string(death.line) + ").");
       }
       if (birth.known && death.known && birth.latest < KXGDateReading::kOpenEnd &&
           death.earliest > KXGDateReading::kOpenStart &&
           death.earliest - birth.latest > yearsInDays(options.maxAge)) {
         dateFinding(death, "age-at-death",
                     id + " dies at least " + std::to_string(years(death.earliest - birth.latest)) +
-                        " years old (born " + spanText(birth) + ", line " +
+                        " years old (born " + eventText(birth) + ", line " +
                         std::to_string(birth.line) + "), more than " +
                         std::to_string(options.maxAge) + ".");
       }
@@ -570,9 +585,9 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
         parentBirth.earliest > KXGDateReading::kOpenStart &&
         born.latest - parentBirth.earliest < yearsInDays(options.minParentAge)) {
       dateFinding(born, "parent-too-young",
-                  childId + " is born (" + spanText(born) + ") when the " + who + " is at most " +
+                  childId + " is born (" + eventText(born) + ") when the " + who + " is at most " +
                       std::to_string(std::max<std::int64_t>(0, years(born.latest - parentBirth.earliest))) +
-                      " (born " + spanText(parentBirth) + ", line " +
+                      " (born " + eventText(parentBirth) + ", line " +
                       std::to_string(parentBirth.line) + ").");
     }
     const int maxAge = mother ? options.maxMotherAge : options.maxFatherAge;
@@ -580,9 +595,9 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
         parentBirth.latest < KXGDateReading::kOpenEnd &&
         born.earliest - parentBirth.latest > yearsInDays(maxAge)) {
       dateFinding(born, mother ? "mother-too-old" : "father-too-old",
-                  childId + " is born (" + spanText(born) + ") when the " + who +
+                  childId + " is born (" + eventText(born) + ") when the " + who +
                       " is at least " + std::to_string(years(born.earliest - parentBirth.latest)) +
-                      " (born " + spanText(parentBirth) + ", line " +
+                      " (born " + eventText(parentBirth) + ", line " +
                       std::to_string(parentBirth.line) + ").");
     }
     const EventSpan& parentDeath = parent.death;
@@ -590,8 +605,8 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     if (parentDeath.known && parentDeath.latest < KXGDateReading::kOpenEnd &&
         born.earliest > parentDeath.latest + grace) {
       dateFinding(born, mother ? "born-after-mother-death" : "born-after-father-death",
-                  childId + " is born (" + spanText(born) + ") after the " + who + " died (" +
-                      spanText(parentDeath) + ", line " + std::to_string(parentDeath.line) + ").");
+                  childId + " is born (" + eventText(born) + ") after the " + who + " died (" +
+                      eventText(parentDeath) + ", line " + std::to_string(parentDeath.line) + ").");
     }
   }
 
@@ -601,14 +616,14 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     const std::string who = (wife ? "wife " : "husband ") + std::string(idOf(spouse.id));
     if (spouse.birth.known && married.latest < spouse.birth.earliest) {
       dateFinding(married, "marriage-before-birth",
-                  "The family " + familyId + " marries (" + spanText(married) + ") before the " +
-                      who + " is born (" + spanText(spouse.birth) + ", line " +
+                  "The family " + familyId + " marries (" + eventText(married) + ") before the " +
+                      who + " is born (" + eventText(spouse.birth) + ", line " +
                       std::to_string(spouse.birth.line) + ").");
     }
     if (spouse.death.known && married.earliest > spouse.death.latest) {
       dateFinding(married, "marriage-after-death",
-                  "The family " + familyId + " marries (" + spanText(married) + ") after the " +
-                      who + " died (" + spanText(spouse.death) + ", line " +
+                  "The family " + familyId + " marries (" + eventText(married) + ") after the " +
+                      who + " died (" + eventText(spouse.death) + ", line " +
                       std::to_string(spouse.death.line) + ").");
     }
   }

@@ -94,6 +94,20 @@ void addProblem(KXGDateReading& reading, std::string_view code, std::string mess
       {code, info ? info->severity : KXGSeverity::kError, std::move(message)});
 }
 
+// The escape of the calendar whose month codes `text` uses, "" when none.
+std::string_view escapeForMonthCodes(std::string_view text) {
+  for (const std::string_view word : kxa_split(text, " ")) {
+    const std::string code = upper(word);
+    if (std::find(kHebrewMonths.begin(), kHebrewMonths.end(), code) != kHebrewMonths.end()) {
+      return "@#DHEBREW@";
+    }
+    if (std::find(kFrenchMonths.begin(), kFrenchMonths.end(), code) != kFrenchMonths.end()) {
+      return "@#DFRENCH R@";
+    }
+  }
+  return {};
+}
+
 // One date of the GEDCOM grammar in a non-Gregorian calendar (or mixed).
 struct CalendarDate {
   Calendar calendar = Calendar::kGregorian;
@@ -175,6 +189,13 @@ KXGDateReading KXGDateReader::readUncached(std::string_view value, bool ldsOrdin
 
   if (text.find("@#") != std::string_view::npos) {
     readWithCalendars(text, reading);
+  } else if (const std::string_view escape = escapeForMonthCodes(text); !escape.empty()) {
+    // Hebrew or French month codes without their escape: read them in their
+    // calendar rather than as unknown Gregorian months.
+    addProblem(reading, "date-calendar-missing",
+               "The date uses month codes of another calendar without " + std::string(escape) +
+                   "; it is read in that calendar.");
+    readWithCalendars(std::string(escape) + " " + std::string(text), reading);
   } else {
     readWithParser(text, reading);
   }
@@ -196,7 +217,12 @@ void KXGDateReader::readWithParser(std::string_view text, KXGDateReading& readin
     if (!quotesItself && !info.data().empty()) {
       message += " (\"" + std::string(kxa_trim(info.data())) + "\")";
     }
-    addProblem(reading, codeOfReason(reason), std::move(message));
+    // A dual year on a date after March is odd but not wrong: a warning.
+    if (reason == kKXDParseErrorInvalidDoubleDate) {
+      reading.problems.push_back({"date-bad-dual-year", KXGSeverity::kWarning, std::move(message)});
+    } else {
+      addProblem(reading, codeOfReason(reason), std::move(message));
+    }
   }
   const std::optional<KXDDate>& date = parser_->date();
   if (!date || date->text()) return;

@@ -19,10 +19,13 @@
 //     by this class's own GEDCOM grammar and converted to days, since the
 //     parser knows neither those month codes nor those calendars;
 //     @#DUNKNOWN@ and @#DROMAN@ give one "date-calendar-unknown" info and no span;
+//     Hebrew or French month codes without their escape are read in their
+//     calendar, with a "date-calendar-missing" warning;
 //   - the parser's reasons 1-3 (two-digit year, one-digit year, a missing
 //     dual year) are prompts of an interactive parser whose settings are
 //     unset: a GEDCOM year is always the year as written, so they are not
-//     reported. The other reasons become findings with the parser's
+//     reported. Reason 10 (a dual year the parser finds invalid, as on a
+//     date after March) is a warning here: the syntax is plain GEDCOM. The other reasons become findings with the parser's
 //     severity and message; only the top-ranked error and the top-ranked
 //     warning of a value are reported.
 //
