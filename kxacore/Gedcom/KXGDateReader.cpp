@@ -350,6 +350,10 @@ void KXGDateReader::readWithCalendars(std::string_view text, KXGDateReading& rea
     };
     const std::int64_t lastMonth = date.calendar == Calendar::kHebrew || date.calendar == Calendar::kFrench ? 13 : 12;
     const std::int64_t startSdn = toSdn(year, month == 0 ? 1 : month, day == 0 ? 1 : day);
+    if (startSdn <= 0 && day != 0 && toSdn(year, month == 0 ? 1 : month, 1) > 0) {
+      addProblem(reading, "date-bad-day", "The day does not exist in that month.");
+      return;
+    }
     if (startSdn <= 0 || year < -4713 || year > 9999) {
       addProblem(reading, "date-bad-year", "The year is out of range for that calendar.");
       return;

@@ -4,6 +4,9 @@
 #include <cstdio>
 #include <cstring>
 
+#include <unicode/bytestream.h>
+#include <unicode/normalizer2.h>
+
 #include "kxacore/Extensions/KXAStringExtensions.h"
 #include "kxacore/Files/Text/KXCStringEncoding.h"
 
@@ -50,6 +53,19 @@ std::string shortened(std::string_view text) {
   std::size_t cut = kShown;
   while (cut > 0 && (static_cast<unsigned char>(text[cut]) & 0xC0) == 0x80) --cut;
   return std::string(text.substr(0, cut)) + "...";
+}
+
+// ANSEL writes a letter's marks as separate characters: compose them (NFC),
+// so "Jürgen" from an ANSEL file equals "Jürgen" from a UTF-8 one.
+void composeInPlace(std::string& text) {
+  UErrorCode status = U_ZERO_ERROR;
+  const icu::Normalizer2* nfc = icu::Normalizer2::getNFCInstance(status);
+  if (U_FAILURE(status) || nfc->isNormalizedUTF8(text, status) || U_FAILURE(status)) return;
+  std::string composed;
+  icu::StringByteSink<std::string> sink(&composed, static_cast<int32_t>(text.size()));
+  status = U_ZERO_ERROR;
+  nfc->normalizeUTF8(0, text, sink, nullptr, status);
+  if (U_SUCCESS(status)) text.swap(composed);
 }
 
 }  // namespace
@@ -266,6 +282,7 @@ std::string_view KXGReader::decodeLine(std::string_view bytes) {
   const std::uint64_t invalidBefore = lineDecoder_->invalidSequences();
   lineDecoder_->decode(asBytes(bytes), lineText_);
   lineDecoder_->finish(lineText_);
+  if (encoding_ == kKXCANSELStringEncoding) composeInPlace(lineText_);
   if (lineDecoder_->invalidSequences() != invalidBefore) {
     report("text-invalid",
            "This line holds bytes that are not " + KXGEncodingDisplayName(encoding_) +

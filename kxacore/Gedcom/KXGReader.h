@@ -22,7 +22,8 @@
 // read as UTF-8 from there on, and a file declaring UTF-8 (without a byte
 // order mark) whose line is not UTF-8 as Windows-1252; either is reported
 // once as "charset-mismatch" (silently when the header names no set).
-// UTF-16 is decoded as a stream and split after decoding.
+// UTF-16 is decoded as a stream and split after decoding. ANSEL lines are
+// composed to NFC, so the same name reads the same from any character set.
 //
 // Lines: "LEVEL [@ID@] TAG [VALUE]". The value is the text after the one
 // space that follows the tag, kept as written (leading and trailing spaces
