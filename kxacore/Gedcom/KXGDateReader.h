@@ -88,7 +88,9 @@ class KXGDateReader {
  private:
   struct Hash {
     using is_transparent = void;
-    std::size_t operator()(std::string_view text) const noexcept {
+    // Deliberately not noexcept: the standard library then stores each key's
+    // hash, so a lookup does not hash every key of the bucket it walks.
+    std::size_t operator()(std::string_view text) const {
       return std::hash<std::string_view>{}(text);
     }
   };
