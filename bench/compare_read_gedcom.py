@@ -5,14 +5,18 @@ PLAC value in them, in one run.
 
     bench/compare_read_gedcom.py [BUILD_DIR] [GEDCOM_DIR] [LARGE_MB]
 
-BUILD_DIR holds tools/kxacore/kxacore (default: build/release). GEDCOM_DIR
+BUILD_DIR holds tools/kxacore/kxacore and bench/kxacore_bench_gedcom
+(default: build/release, configured with -DKXA_BUILD_BENCH=ON). GEDCOM_DIR
 holds the real files (default: ../shared/data/gedcom beside the repository).
 A large file of at least LARGE_MB (default 120) megabytes is built in a
 temporary folder by repeating the real files' records with renamed ids (in
 UTF-8, under one header), and deleted after. read-gedcom is installed with
 npm into a scratch folder; without npm or the registry its column is skipped.
-Times are wall clock of a whole run, best of three for files under 10 MB;
-peak memory is the child's maximum resident set.
+Two speeds for kxacore: in process (kxacore_bench_gedcom: the file in
+memory, every check, like read-gedcom's timing of parse and values) and the
+whole CLI run (process start, reading the file, the report: wall clock, best
+of three under 10 MB). The ratio compares the in-process speeds. Peak memory
+is the child's maximum resident set.
 """
 import json
 import os
@@ -29,6 +33,7 @@ build = sys.argv[1] if len(sys.argv) > 1 else os.path.join(ROOT, "build", "relea
 gedcom_dir = sys.argv[2] if len(sys.argv) > 2 else os.path.join(ROOT, "..", "shared", "data", "gedcom")
 large_mb = int(sys.argv[3]) if len(sys.argv) > 3 else 120
 kxacore = os.path.join(build, "tools", "kxacore", "kxacore")
+bench_binary = os.path.join(build, "bench", "kxacore_bench_gedcom")
 
 # How each real file is written (for building the large file in UTF-8).
 ENCODINGS = {"norse-gods-cp1252.ged": "cp1252", "TGC55C.ged": "latin-1", "washington.ged": "cp1252"}
@@ -97,6 +102,17 @@ def build_large_file(files, folder, target_mb):
     return path, rounds
 
 
+def in_process_speeds(folder):
+    """MB/s of KXGChecker per file name, from kxacore_bench_gedcom."""
+    if not os.path.exists(bench_binary):
+        return {}
+    result = subprocess.run([bench_binary, "--benchmark_min_time=0.5", "--benchmark_format=json"],
+                            env=dict(os.environ, KXA_GEDCOM_DIR=folder), check=True,
+                            capture_output=True, text=True)
+    return {b["name"].split("/", 1)[1]: b["bytes_per_second"] / 1e6
+            for b in json.loads(result.stdout)["benchmarks"]}
+
+
 def install_read_gedcom(folder):
     npm = shutil.which("npm")
     node = shutil.which("node")
@@ -126,15 +142,22 @@ def main():
         print(f"large file: {os.path.getsize(large) / 1e6:.0f} MB ({rounds} rounds of {len(files)} files)")
         if peer is None:
             print(f"read-gedcom: skipped ({why})")
-        print(f"{'file':<26}{'MB':>8}{'kxacore MB/s':>14}{'peak MB':>9}"
-              f"{'read-gedcom MB/s':>18}{'peak MB':>9}{'ratio':>8}")
+        speeds = in_process_speeds(gedcom_dir)
+        speeds.update(in_process_speeds(scratch))
+        if not speeds:
+            print(f"in-process speeds: skipped ({bench_binary} is missing: configure with -DKXA_BUILD_BENCH=ON)")
+        print(f"{'file':<26}{'MB':>7}{'kxacore MB/s':>13}{'CLI MB/s':>9}{'peak MB':>8}"
+              f"{'read-gedcom MB/s':>17}{'peak MB':>8}{'ratio':>7}")
         total_ours = total_theirs = total_bytes = 0.0
         for path in files + [large]:
+            name = os.path.basename(path)
             size_mb = os.path.getsize(path) / 1e6
             repeats = 3 if size_mb < 10 else 1
-            ours = min(run_measured([kxacore, "gedcom", "check", path])[0] for _ in range(repeats))
+            cli = min(run_measured([kxacore, "gedcom", "check", path])[0] for _ in range(repeats))
             _, our_peak, _, _ = run_measured([kxacore, "gedcom", "check", path])
-            line = f"{os.path.basename(path):<26}{size_mb:8.1f}{size_mb / ours:14.1f}{our_peak:9.0f}"
+            ours = speeds.get(name)
+            line = (f"{name:<26}{size_mb:7.1f}{(f'{ours:.1f}' if ours else '-'):>13}"
+                    f"{size_mb / cli:9.1f}{our_peak:8.0f}")
             if peer is not None:
                 node, module, script = peer
                 best, their_peak, failed = None, 0.0, None
@@ -148,19 +171,22 @@ def main():
                     best = seconds if best is None else min(best, seconds)
                     their_peak = max(their_peak, peak)
                 if failed:
-                    line += f"{failed:>18}"
+                    line += f"{failed:>17}"
                 else:
-                    line += f"{size_mb / best:18.1f}{their_peak:9.0f}{best / ours:8.1f}"
-                    if path != large:
-                        total_ours += ours
-                        total_theirs += best
-                        total_bytes += size_mb
+                    theirs = size_mb / best
+                    line += f"{theirs:17.1f}{their_peak:8.0f}"
+                    if ours:
+                        line += f"{ours / theirs:7.1f}"
+                        if path != large:
+                            total_ours += size_mb / ours
+                            total_theirs += best
+                            total_bytes += size_mb
             print(line)
         if total_ours > 0:
-            print(f"real files together: kxacore {total_bytes / total_ours:.1f} MB/s, "
+            print(f"real files both read, together: kxacore {total_bytes / total_ours:.1f} MB/s, "
                   f"read-gedcom {total_bytes / total_theirs:.1f} MB/s, ratio {total_theirs / total_ours:.1f}")
-        print("kxacore times include process start, reading, decoding, every check and the report;")
-        print("read-gedcom times cover parseGedcom and the DATE/NAME/PLAC parses only (file already in memory).")
+        print("kxacore MB/s: in process, every check; CLI MB/s: the whole program run, report included.")
+        print("read-gedcom: parseGedcom and the DATE/NAME/PLAC parses, file already in memory.")
     finally:
         shutil.rmtree(scratch, ignore_errors=True)
 

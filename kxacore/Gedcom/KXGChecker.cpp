@@ -589,9 +589,12 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     if (parentBirth.known && born.latest < KXGDateReading::kOpenEnd &&
         parentBirth.earliest > KXGDateReading::kOpenStart &&
         born.latest - parentBirth.earliest < yearsInDays(options.minParentAge)) {
+      const std::int64_t age = years(born.latest - parentBirth.earliest);
       dateFinding(born, "parent-too-young",
-                  childId + " is born (" + eventText(born) + ") when the " + who + " is at most " +
-                      std::to_string(std::max<std::int64_t>(0, years(born.latest - parentBirth.earliest))) +
+                  childId + " is born (" + eventText(born) + ") " +
+                      (born.latest < parentBirth.earliest
+                           ? "before the " + who + " is born"
+                           : "when the " + who + " is at most " + std::to_string(age)) +
                       " (born " + eventText(parentBirth) + ", line " +
                       std::to_string(parentBirth.line) + ").");
     }

@@ -15,8 +15,10 @@
 // Streaming: findings of lines and values are handed to the delegate as the
 // file is read; pointer and date-consistency findings come at the end. The
 // checker keeps, besides the reader's current record, only the table of
-// record ids, the links between individuals and families, and four dates
-// (as day spans) per individual and one per family.
+// record ids, the links between individuals and families, pointers read
+// before their record, five dates (as day spans) per individual and family,
+// the distinct texts of those dates (for messages) and bounded caches of
+// value readings.
 //
 // Consistency checks compare spans of days (see KXGDateReader.h), and an
 // alarm is raised only when every reading of both dates allows it: "ABT

@@ -185,6 +185,14 @@ TEST(KXGCheckerTest, FileLevelProblems) {
             (std::vector<std::string>{"charset-missing"}));
   EXPECT_EQ(codesOf(KXGChecker::reportForBytes(bytesOf("0 HEAD\n1 CHAR EBCDIC\n0 TRLR\n"))),
             (std::vector<std::string>{"charset-unknown"}));
+  // A byte-order mark against the declaration, and UTF-16 declared over 8-bit bytes.
+  const KXGReport marked = KXGChecker::reportForBytes(bytesOf("\xEF\xBB\xBF" "0 HEAD\n1 CHAR ANSEL\n0 TRLR\n"));
+  EXPECT_EQ(codesOf(marked), std::vector<std::string>{"charset-mismatch"});
+  EXPECT_EQ(marked.findings[0].line, 2u);
+  EXPECT_EQ(marked.summary.encoding, "UTF-8");
+  EXPECT_EQ(codesOf(KXGChecker::reportForBytes(bytesOf("0 HEAD\n1 CHAR UNICODE\n0 TRLR\n"))),
+            std::vector<std::string>{"charset-mismatch"});
+  EXPECT_TRUE(KXGChecker::reportForBytes(bytesOf("\xEF\xBB\xBF" "0 HEAD\n1 CHAR UTF-8\n0 TRLR\n")).findings.empty());
 }
 
 TEST(KXGCheckerTest, BinaryBytesAreReportedAndReadPast) {
