@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <array>
+#include <bit>
 #include <charconv>
 #include <cstring>
 
@@ -316,42 +317,63 @@ class ANSELDecoder final : public KXCTextDecoder {
  public:
   void decode(std::span<const std::uint8_t> bytes, std::string& out) override {
     using namespace kxc_ansel_internal;
-    const std::size_t start = out.size();
-    // Three bytes at most per input byte, plus one for the four-byte stores
-    // and three for a held mark.
-    out.resize(start + 3 * bytes.size() + 4 + 3);
-    char* dst = out.data() + start;
+    // Most genealogy text is ASCII, one byte out per byte in, with some
+    // room for diacritics so that a whole file is not copied by a late
+    // growth. Reserving does not write the memory; decoding piece by piece
+    // into a small buffer and appending writes the output once (sizing the
+    // string first would write it twice, zeros first).
+    out.reserve(out.size() + bytes.size() + bytes.size() / 8);
     const std::uint8_t* src = bytes.data();
     const std::uint8_t* const end = src + bytes.size();
+    // The state lives in locals during the loop: stores through `dst` (a
+    // char pointer) could alias the members and force a reload per byte.
+    bool holding = holding_;
+    std::uint8_t held = held_;
     while (src < end) {
-      if (!holding_) {
-        // The hot loop: no mark pending, each byte is one table store.
-        while (src < end && !isCombiningMark(*src)) {
-          const UTF8Entry& entry = kUTF8[*src++];
-          std::memcpy(dst, entry.bytes, 4);
-          dst += entry.length;
+      const std::uint8_t* const pieceEnd = src + std::min<std::size_t>(kPieceSize, static_cast<std::size_t>(end - src));
+      char* const piece = pieceBuffer_.get();
+      char* dst = piece;
+      while (src < pieceEnd) {
+        if (holding) {
+          const std::uint8_t byte = *src++;
+          if (byte == 0x0D) {
+            dst = put(dst, held);
+            dst = put(dst, byte);
+            holding = false;
+            continue;
+          }
+          // The current character takes the held unit's place; the held
+          // unit moves on and stays held while the current byte is a mark.
+          dst = put(dst, byte);
+          if (!isCombiningMark(byte)) {
+            dst = put(dst, held);
+            holding = false;
+          }
+          continue;
         }
-        if (src == end) break;
-        held_ = *src++;
-        holding_ = true;
-        continue;
+        // The hot path: no mark pending. ASCII is copied as it is, sixteen
+        // bytes at a time; any other byte is one table store.
+        if (pieceEnd - src >= 16) {
+          std::uint64_t words[2];
+          std::memcpy(words, src, 16);
+          std::memcpy(dst, src, 16);  // the ASCII prefix is right; the rest is overwritten
+          const std::size_t ascii = asciiPrefixLength(words[0], words[1]);
+          src += ascii;
+          dst += ascii;
+          if (ascii == 16) continue;
+        }
+        const std::uint8_t byte = *src++;
+        if (isCombiningMark(byte)) {
+          held = byte;
+          holding = true;
+        } else {
+          dst = put(dst, byte);
+        }
       }
-      const std::uint8_t byte = *src++;
-      if (byte == 0x0D) {
-        dst = put(dst, held_);
-        dst = put(dst, byte);
-        holding_ = false;
-        continue;
-      }
-      // The current character takes the held unit's place; the held unit
-      // moves on and stays held while the current byte is itself a mark.
-      dst = put(dst, byte);
-      if (!isCombiningMark(byte)) {
-        dst = put(dst, held_);
-        holding_ = false;
-      }
+      out.append(piece, static_cast<std::size_t>(dst - piece));
     }
-    out.resize(static_cast<std::size_t>(dst - out.data()));
+    holding_ = holding;
+    held_ = held;
   }
 
   void finish(std::string& out) override {
@@ -362,12 +384,34 @@ class ANSELDecoder final : public KXCTextDecoder {
   }
 
  private:
+  static constexpr std::uint64_t kHighBits = 0x8080808080808080ULL;
+
+  // Bytes before the first one with its high bit set, of sixteen in memory order.
+  static std::size_t asciiPrefixLength(std::uint64_t first, std::uint64_t second) {
+    const std::uint64_t high = (first & kHighBits) != 0 ? first & kHighBits : second & kHighBits;
+    const std::size_t base = (first & kHighBits) != 0 ? 0 : 8;
+    if (high == 0) return 16;
+    if constexpr (std::endian::native == std::endian::little) {
+      return base + static_cast<std::size_t>(std::countr_zero(high)) / 8;
+    } else {
+      return base + static_cast<std::size_t>(std::countl_zero(high)) / 8;
+    }
+  }
+
+  // Input bytes decoded into the piece buffer before it is appended.
+  static constexpr std::size_t kPieceSize = 4096;
+  // Room past three bytes per input byte: the unit held over from the
+  // previous piece, and what four-byte stores and sixteen-byte copies write
+  // beyond the bytes they keep.
+  static constexpr std::size_t kSlack = 16;
+
   static char* put(char* dst, std::uint8_t byte) {
     const auto& entry = kxc_ansel_internal::kUTF8[byte];
     std::memcpy(dst, entry.bytes, 4);
     return dst + entry.length;
   }
 
+  std::unique_ptr<char[]> pieceBuffer_ = std::make_unique_for_overwrite<char[]>(kPieceSize * 3 + kSlack);
   std::uint8_t held_ = 0;
   bool holding_ = false;
 };
@@ -381,9 +425,14 @@ using ConverterPtr = std::unique_ptr<UConverter, ConverterCloser>;
 
 class ICUDecoder final : public KXCTextDecoder {
  public:
-  explicit ICUDecoder(ConverterPtr converter) : converter_(std::move(converter)) {
+  explicit ICUDecoder(ConverterPtr converter) : converter_(std::move(converter)) {}
+
+  // Routes invalid input to substituteAndCount; false when ICU refuses, and
+  // then the decoder must not be used (it would substitute without counting).
+  bool installCallback() {
     UErrorCode status = U_ZERO_ERROR;
     ucnv_setToUCallBack(converter_.get(), &ICUDecoder::substituteAndCount, this, nullptr, nullptr, &status);
+    return U_SUCCESS(status);
   }
 
   void decode(std::span<const std::uint8_t> bytes, std::string& out) override {
@@ -503,7 +552,9 @@ std::unique_ptr<KXCTextDecoder> KXCTextDecoder::decoderForEncoding(KXCStringEnco
   UErrorCode status = U_ZERO_ERROR;
   ConverterPtr converter(ucnv_open(std::string(info->icuName).c_str(), &status));
   if (U_FAILURE(status) || !converter) return nullptr;
-  return std::make_unique<ICUDecoder>(std::move(converter));
+  auto decoder = std::make_unique<ICUDecoder>(std::move(converter));
+  if (!decoder->installCallback()) return nullptr;
+  return decoder;
 }
 
 std::span<const KXCStringEncodingInfo> KXCAvailableStringEncodings() {
