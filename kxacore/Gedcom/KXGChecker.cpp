@@ -33,13 +33,14 @@ struct TransparentHash {
 template <typename V>
 using StringMap = std::unordered_map<std::string, V, TransparentHash, std::equal_to<>>;
 
-// One dated event, as the consistency checks need it.
+// One dated event, as the consistency checks need it. Compact: millions of
+// them are kept. Day numbers and the open-end sentinels fit 32 bits.
 struct EventSpan {
-  std::int64_t earliest = 0;
-  std::int64_t latest = 0;
-  std::uint64_t line = 0;
-  std::uint32_t text = 0;  // index of the date as written
-  bool known = false;
+  std::int32_t earliest = 0;
+  std::int32_t latest = 0;
+  std::uint32_t line = 0;      // saturated beyond 2^32 - 1
+  std::uint32_t text = kNone;  // index of the date as written; kNone: no date
+  [[nodiscard]] bool known() const noexcept { return text != kNone; }
 };
 
 struct Individual {
@@ -55,16 +56,16 @@ struct Family {
 };
 
 struct IdEntry {
-  Kind kind = Kind::kUndefined;
-  std::uint32_t index = kNone;  // into individuals or families
   std::uint64_t line = 0;
-  std::string_view tag;         // the record's tag, for messages (interned)
+  std::uint32_t index = kNone;  // into individuals or families
+  Kind kind = Kind::kUndefined;
+  std::uint8_t tag = 0;         // the record's tag, for messages (interned)
 };
 
 // A pointer whose target was not yet defined when it was read.
 struct PendingPointer {
   std::uint32_t target = 0;
-  std::uint64_t line = 0;
+  std::uint32_t line = 0;  // saturated beyond 2^32 - 1
   std::uint16_t tag = 0;
 };
 
@@ -72,10 +73,14 @@ struct PendingPointer {
 struct Link {
   std::uint32_t family = 0;  // id indices
   std::uint32_t individual = 0;
-  std::uint64_t line = 0;
+  std::uint32_t line = 0;    // saturated beyond 2^32 - 1
   Role role = Role::kSpouse;
   bool fromFamily = false;
 };
+
+std::uint32_t compactLine(std::uint64_t line) {
+  return static_cast<std::uint32_t>(std::min<std::uint64_t>(line, std::numeric_limits<std::uint32_t>::max()));
+}
 
 bool isPointer(std::string_view value) {
   return value.size() >= 3 && value.front() == '@' && value.back() == '@' && value[1] != '#' &&
@@ -166,7 +171,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   std::vector<PendingPointer> pending;
   std::vector<Link> links;
   std::vector<std::string> tags;  // interned tags of pending pointers
-  std::unordered_set<std::string> recordTags;
+  std::vector<std::string> recordTags;  // at most 256; the last stands for the rest
   // Dates of events as written, for messages; events share equal texts.
   StringMap<std::uint32_t> dateTextIndex;
   std::vector<std::string_view> dateTexts;
@@ -215,8 +220,17 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     return index;
   }
 
-  std::string_view internTag(std::string_view tag) {
-    return *recordTags.emplace(tag).first;
+  std::uint8_t internTag(std::string_view tag) {
+    const auto found = std::find(recordTags.begin(), recordTags.end(), tag);
+    if (found != recordTags.end()) return static_cast<std::uint8_t>(found - recordTags.begin());
+    if (recordTags.size() == 255) recordTags.emplace_back("other");
+    if (recordTags.size() >= 256) return 255;
+    recordTags.emplace_back(tag);
+    return static_cast<std::uint8_t>(recordTags.size() - 1);
+  }
+
+  std::string tagName(std::uint8_t tag) const {
+    return tag < recordTags.size() ? recordTags[tag] : std::string("?");
   }
 
   // ---- Records -----------------------------------------------------------
@@ -254,7 +268,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
       IdEntry& entry = ids[self];
       if (entry.kind != Kind::kUndefined) {
         emit(root.number, "id-duplicate",
-             "The id " + root.xref + " is already used by the " + std::string(entry.tag) +
+             "The id " + root.xref + " is already used by the " + tagName(entry.tag) +
                  " record on line " + std::to_string(entry.line) + ".",
              root.tag, root.xref);
       } else {
@@ -330,7 +344,13 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     }
     if (!reading.hasSpan || self == kNone || parent == nullptr || parent->level != 1) return;
     const auto keep = [&](EventSpan& slot) {
-      if (!slot.known) slot = {reading.earliest, reading.latest, line.number, internDateText(line.value), true};
+      if (slot.known()) return;
+      slot.earliest = static_cast<std::int32_t>(
+          std::clamp(reading.earliest, KXGDateReading::kOpenStart, KXGDateReading::kOpenEnd));
+      slot.latest = static_cast<std::int32_t>(
+          std::clamp(reading.latest, KXGDateReading::kOpenStart, KXGDateReading::kOpenEnd));
+      slot.line = compactLine(line.number);
+      slot.text = internDateText(line.value);
     };
     const std::string& event = parent->tag;
     if (kind == Kind::kIndividual) {
@@ -425,16 +445,18 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
       if (found == tags.end() && tags.size() < std::numeric_limits<std::uint16_t>::max()) {
         tags.push_back(line.tag);
       }
-      pending.push_back({target, line.number, tagIndex});
+      pending.push_back({target, compactLine(line.number), tagIndex});
     } else {
       checkPointerKind(line.number, line.tag, line.value, entry);
     }
     if (self == kNone || line.level != 1) return;
     if (kind == Kind::kIndividual && (line.tag == "FAMS" || line.tag == "FAMC")) {
-      links.push_back({target, self, line.number, line.tag == "FAMS" ? Role::kSpouse : Role::kChild, false});
+      links.push_back({target, self, compactLine(line.number),
+                       line.tag == "FAMS" ? Role::kSpouse : Role::kChild, false});
     } else if (kind == Kind::kFamily &&
                (line.tag == "HUSB" || line.tag == "WIFE" || line.tag == "CHIL")) {
-      links.push_back({self, target, line.number, line.tag == "CHIL" ? Role::kChild : Role::kSpouse, true});
+      links.push_back({self, target, compactLine(line.number),
+                       line.tag == "CHIL" ? Role::kChild : Role::kSpouse, true});
       Family& family = families[ids[self].index];
       if (line.tag == "HUSB" && family.husband == kNone) family.husband = target;
       if (line.tag == "WIFE" && family.wife == kNone) family.wife = target;
@@ -447,7 +469,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     if (expected == Kind::kUndefined || entry.kind == expected) return;
     emit(line, "pointer-wrong-type",
          std::string(tag) + " points to " + std::string(value) + ", which is the " +
-             std::string(entry.tag) + " record on line " + std::to_string(entry.line) + ".",
+             tagName(entry.tag) + " record on line " + std::to_string(entry.line) + ".",
          tag, value);
   }
 
@@ -548,22 +570,22 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
       const std::string id(idOf(person.id));
       const auto& birth = person.birth;
       const auto& death = person.death;
-      if (birth.known && death.known && birth.earliest > death.latest) {
+      if (birth.known() && death.known() && birth.earliest > death.latest) {
         dateFinding(birth, "birth-after-death",
                     id + " is born (" + eventText(birth) + ") after dying (" + eventText(death) +
                         ", line " + std::to_string(death.line) + ").");
       }
-      if (birth.known && person.baptism.known && person.baptism.latest < birth.earliest) {
+      if (birth.known() && person.baptism.known() && person.baptism.latest < birth.earliest) {
         dateFinding(person.baptism, "baptism-before-birth",
                     id + " is baptised (" + eventText(person.baptism) + ") before being born (" +
                         eventText(birth) + ", line " + std::to_string(birth.line) + ").");
       }
-      if (death.known && person.burial.known && person.burial.latest < death.earliest) {
+      if (death.known() && person.burial.known() && person.burial.latest < death.earliest) {
         dateFinding(person.burial, "burial-before-death",
                     id + " is buried (" + eventText(person.burial) + ") before dying (" +
                         eventText(death) + ", line " + std::to_string(death.line) + ").");
       }
-      if (birth.known && death.known && birth.latest < KXGDateReading::kOpenEnd &&
+      if (birth.known() && death.known() && birth.latest < KXGDateReading::kOpenEnd &&
           death.earliest > KXGDateReading::kOpenStart &&
           death.earliest - birth.latest > yearsInDays(options.maxAge)) {
         dateFinding(death, "age-at-death",
@@ -586,7 +608,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     const std::string parentId(idOf(parent.id));
     const std::string who = (mother ? "mother " : "father ") + parentId;
     const EventSpan& parentBirth = parent.birth;
-    if (parentBirth.known && born.latest < KXGDateReading::kOpenEnd &&
+    if (parentBirth.known() && born.latest < KXGDateReading::kOpenEnd &&
         parentBirth.earliest > KXGDateReading::kOpenStart &&
         born.latest - parentBirth.earliest < yearsInDays(options.minParentAge)) {
       const std::int64_t age = years(born.latest - parentBirth.earliest);
@@ -599,7 +621,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
                       std::to_string(parentBirth.line) + ").");
     }
     const int maxAge = mother ? options.maxMotherAge : options.maxFatherAge;
-    if (parentBirth.known && born.earliest > KXGDateReading::kOpenStart &&
+    if (parentBirth.known() && born.earliest > KXGDateReading::kOpenStart &&
         parentBirth.latest < KXGDateReading::kOpenEnd &&
         born.earliest - parentBirth.latest > yearsInDays(maxAge)) {
       dateFinding(born, mother ? "mother-too-old" : "father-too-old",
@@ -610,7 +632,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     }
     const EventSpan& parentDeath = parent.death;
     const std::int64_t grace = mother ? 0 : 366;
-    if (parentDeath.known && parentDeath.latest < KXGDateReading::kOpenEnd &&
+    if (parentDeath.known() && parentDeath.latest < KXGDateReading::kOpenEnd &&
         born.earliest > parentDeath.latest + grace) {
       dateFinding(born, mother ? "born-after-mother-death" : "born-after-father-death",
                   childId + " is born (" + eventText(born) + ") after the " + who + " died (" +
@@ -622,13 +644,13 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     const EventSpan& married = family.marriage;
     const std::string familyId(idOf(family.id));
     const std::string who = (wife ? "wife " : "husband ") + std::string(idOf(spouse.id));
-    if (spouse.birth.known && married.latest < spouse.birth.earliest) {
+    if (spouse.birth.known() && married.latest < spouse.birth.earliest) {
       dateFinding(married, "marriage-before-birth",
                   "The family " + familyId + " marries (" + eventText(married) + ") before the " +
                       who + " is born (" + eventText(spouse.birth) + ", line " +
                       std::to_string(spouse.birth.line) + ").");
     }
-    if (spouse.death.known && married.earliest > spouse.death.latest) {
+    if (spouse.death.known() && married.earliest > spouse.death.latest) {
       dateFinding(married, "marriage-after-death",
                   "The family " + familyId + " marries (" + eventText(married) + ") after the " +
                       who + " died (" + eventText(spouse.death) + ", line " +
@@ -647,13 +669,13 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     children.erase(std::unique(children.begin(), children.end()), children.end());
     for (const auto& [familyIndex, childId] : children) {
       const Individual* child = individualOf(childId);
-      if (child == nullptr || !child->birth.known) continue;
+      if (child == nullptr || !child->birth.known()) continue;
       const Family& family = families[familyIndex];
       if (const Individual* mother = individualOf(family.wife)) checkParent(*child, *mother, true);
       if (const Individual* father = individualOf(family.husband)) checkParent(*child, *father, false);
     }
     for (const Family& family : families) {
-      if (!family.marriage.known) continue;
+      if (!family.marriage.known()) continue;
       if (const Individual* husband = individualOf(family.husband)) checkSpouse(family, *husband, false);
       if (const Individual* wife = individualOf(family.wife)) checkSpouse(family, *wife, true);
     }

@@ -18,7 +18,9 @@
 // record ids, the links between individuals and families, pointers read
 // before their record, five dates (as day spans) per individual and family,
 // the distinct texts of those dates (for messages) and bounded caches of
-// value readings.
+// value readings: about 250 bytes per record (a 1.2 GB file of 4.3 million
+// records peaks near 1 GB). The line numbers kept for the end are 32-bit:
+// past line 4294967295 those findings name that line.
 //
 // Consistency checks compare spans of days (see KXGDateReader.h), and an
 // alarm is raised only when every reading of both dates allows it: "ABT
