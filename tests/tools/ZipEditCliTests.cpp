@@ -141,7 +141,10 @@ INSTANTIATE_TEST_SUITE_P(
                     FailingEdit{{"--rename", "dir/b.txt=a.txt", "--delete", "zzz"}, "zzz"},
                     FailingEdit{{"--rename", "ghost=x"}, "x"},
                     FailingEdit{{"--add", "@/no-such-file"}, "no-such-file"},
-                    FailingEdit{{"--add", "@/folder=f"}, "f"}));
+                    FailingEdit{{"--add", "@/folder=f"}, "f"},
+                    FailingEdit{{"--add", "@/new.txt=../up"}, "../up"},
+                    FailingEdit{{"--rename", "dir/b.txt=/abs"}, "/abs"},
+                    FailingEdit{{"--replace", "@/new.txt=C:a.txt"}, "C:a.txt"}));
 
 TEST_F(ZipEditCliTest, UsageErrorsAndUnopenableArchivesExitWithTwo) {
   write("text.txt", "not a zip");

@@ -176,6 +176,9 @@ nlohmann::ordered_json entryFacts(zip_t* archive, const std::string& name) {
   return facts;
 }
 
+// Such names would let an extracting tool write outside its destination.
+constexpr const char* kUnsafeName = "unsafe entry name (absolute, a drive, '..' or a trailing '/')";
+
 // Checks one step against the archive as it stands and records it; the
 // failure, if any, is kept on the step.
 void applyStep(KXFLibZipArchiver& archiver, EditDelegate& delegate, EditStep& step) {
@@ -189,7 +192,9 @@ void applyStep(KXFLibZipArchiver& archiver, EditDelegate& delegate, EditStep& st
       if (!archiver.deleteFile(step.name)) step.failure = "cannot be deleted";
       return;
     case EditKind::kRename:
-      if (!archiver.checkContainsFile(step.source)) {
+      if (!KXFLibZipArchiver::isSafeEntryName(step.name)) {
+        step.failure = kUnsafeName;
+      } else if (!archiver.checkContainsFile(step.source)) {
         step.failure = "no entry " + step.source + " to rename";
       } else if (archiver.checkContainsFile(step.name)) {
         step.failure = "an entry of that name already exists";
@@ -200,7 +205,9 @@ void applyStep(KXFLibZipArchiver& archiver, EditDelegate& delegate, EditStep& st
     case EditKind::kReplace:
     case EditKind::kAdd: {
       const bool replacing = step.kind == EditKind::kReplace;
-      if (replacing && !archiver.checkContainsFile(step.name)) {
+      if (!KXFLibZipArchiver::isSafeEntryName(step.name)) {
+        step.failure = kUnsafeName;
+      } else if (replacing && !archiver.checkContainsFile(step.name)) {
         step.failure = "no such entry to replace";
       } else if (!replacing && archiver.checkContainsFile(step.name)) {
         step.failure = "already in the archive (use --replace)";

@@ -76,8 +76,9 @@ bool writeAll(int fd, const std::uint8_t* bytes, std::size_t count) {
   return true;
 }
 
-// The checks that keep a name inside the folder it is extracted to.
-bool isSafeRelativeName(std::string_view name) {
+}  // namespace
+
+bool KXFLibZipArchiver::isSafeEntryName(std::string_view name) {
   if (name.empty() || name.front() == '/' || name.front() == '\\') return false;
   if (name.size() >= 2 && name[1] == ':') return false;
   std::size_t start = 0;
@@ -89,6 +90,8 @@ bool isSafeRelativeName(std::string_view name) {
   }
   return name.back() != '/' && name.back() != '\\';
 }
+
+namespace {
 
 // True when no folder between `folder` and `target` is a symbolic link, so
 // a write cannot be steered outside `folder` by one planted there.
@@ -219,7 +222,7 @@ std::optional<std::vector<std::uint8_t>> KXFLibZipArchiver::fileDataForFileWithN
 }
 
 bool KXFLibZipArchiver::extractFileWithName(std::string_view entryName, const fs::path& folder) {
-  if (!zipFile_ || !isSafeRelativeName(entryName)) return false;
+  if (!zipFile_ || !isSafeEntryName(entryName)) return false;
   const fs::path target = folder / fs::path(std::string(entryName));
   std::error_code error;
   if (fs::exists(fs::symlink_status(target, error)) || !hasNoLinkedFolderBelow(folder, target)) {

@@ -133,6 +133,10 @@ class KXFLibZipArchiver {
   bool deleteFile(std::string_view entryName);
   // The new name is stored as UTF-8; an existing entry of that name is an error.
   bool renameFile(std::string_view oldName, std::string_view newName);
+  // False for a name that would leave the folder it is extracted to: empty,
+  // ending in a separator, starting with '/' or '\\' or a drive prefix
+  // ("C:"), or holding a ".." component (either separator counts).
+  [[nodiscard]] static bool isSafeEntryName(std::string_view entryName);
   // Exact, case-sensitive, full-path match.
   [[nodiscard]] bool checkContainsFile(std::string_view entryName);
 
