@@ -93,6 +93,19 @@ bool KXFLibZipArchiver::isSafeEntryName(std::string_view name) {
 
 namespace {
 
+// Opens an entry whose size is known, filling `stat`. Methods libzip cannot
+// decode are refused before zip_fopen_index, whose failure path in libzip
+// 1.7.3 leaks the entry's source for them.
+ZipFileHandle openEntry(zip_t* archive, std::uint64_t index, zip_stat_t& stat) {
+  if (zip_stat_index(archive, index, 0, &stat) != 0) return nullptr;
+  const zip_uint64_t needed = ZIP_STAT_SIZE | ZIP_STAT_COMP_METHOD | ZIP_STAT_ENCRYPTION_METHOD;
+  if ((stat.valid & needed) != needed || !zip_compression_method_supported(stat.comp_method, 0) ||
+      (stat.encryption_method != ZIP_EM_NONE && !zip_encryption_method_supported(stat.encryption_method, 0))) {
+    return nullptr;
+  }
+  return ZipFileHandle(zip_fopen_index(archive, index, 0));
+}
+
 // True when no folder between `folder` and `target` is a symbolic link, so
 // a write cannot be steered outside `folder` by one planted there.
 bool hasNoLinkedFolderBelow(const fs::path& folder, const fs::path& target) {
@@ -201,10 +214,7 @@ std::optional<std::vector<std::uint8_t>> KXFLibZipArchiver::fileDataForFileWithN
   const auto index = locate(entryName);
   if (!index) return std::nullopt;
   zip_stat_t stat;
-  if (zip_stat_index(zipFile(), *index, 0, &stat) != 0 || !(stat.valid & ZIP_STAT_SIZE)) {
-    return std::nullopt;
-  }
-  ZipFileHandle file(zip_fopen_index(zipFile(), *index, 0));
+  ZipFileHandle file = openEntry(zipFile(), *index, stat);
   if (!file) return std::nullopt;
   // The bytes are read (and checked) but not kept, so a recorded size, true
   // or not, never decides how much memory is taken.
@@ -231,8 +241,7 @@ bool KXFLibZipArchiver::extractFileWithName(std::string_view entryName, const fs
   const auto index = locate(entryName);
   if (!index) return false;
   zip_stat_t stat;
-  if (zip_stat_index(zipFile(), *index, 0, &stat) != 0 || !(stat.valid & ZIP_STAT_SIZE)) return false;
-  ZipFileHandle file(zip_fopen_index(zipFile(), *index, 0));
+  ZipFileHandle file = openEntry(zipFile(), *index, stat);
   if (!file) return false;
   // O_EXCL with O_CREAT refuses an existing path, a symbolic link included,
   // so a file or link planted after the check above is not written through.

@@ -355,8 +355,12 @@ TEST_P(LibZipDamagedArchiveTest, ReadingFailsWithoutALeftoverFile) {
                                  "local = data.find(b'PK\\x03\\x04'); central = data.find(b'PK\\x01\\x02')\n") +
                          GetParam().patch + "\nopen(archive, 'wb').write(data)",
                      archive));
+  const std::string before = read(archive);
   auto archiver = KXFLibZipArchiver::archiverForPath(archive);
-  ASSERT_TRUE(archiver);
+  if (!archiver) {  // refusing the whole archive is a fine answer too
+    EXPECT_EQ(read(archive), before);
+    return;
+  }
   EXPECT_FALSE(archiver->fileDataForFileWithName("e").has_value()) << GetParam().what;
   EXPECT_FALSE(archiver->extractFileWithName("e", dir_ / "out")) << GetParam().what;
   EXPECT_FALSE(fs::exists(dir_ / "out" / "e"));
@@ -370,6 +374,8 @@ INSTANTIATE_TEST_SUITE_P(
         DamagedArchive{"size claims 4 GB",
                        "data[central + 24:central + 28] = struct.pack('<I', 0xfffffff0)\n"
                        "data[local + 22:local + 26] = struct.pack('<I', 0xfffffff0)"},
+        DamagedArchive{"strong encryption, which libzip cannot read", "data[central + 8] |= 0x41"},
+        DamagedArchive{"unknown method", "data[central + 10] = 99; data[local + 8] = 99"},
         DamagedArchive{"size claims less", "data[central + 24:central + 28] = struct.pack('<I', 100)\n"
                                            "data[local + 22:local + 26] = struct.pack('<I', 100)"}));
 
