@@ -1,5 +1,19 @@
 #include "kxacore/Files/Archives/KXFFileExtractHelper.h"
 
+#include <algorithm>
+
+namespace {
+
+// Compared with '\' taken as '/': the walk only normalises names after the
+// skip question, and callers ask for "dir/file" either way.
+bool sameEntryName(std::string_view a, std::string_view b) {
+  return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](char x, char y) {
+    return (x == '\\' ? '/' : x) == (y == '\\' ? '/' : y);
+  });
+}
+
+}  // namespace
+
 std::optional<std::vector<std::uint8_t>> KXFFileExtractHelper::extractDataForFile(std::string_view fileName,
                                                                                   KXFUnarchiver& unarchiver) {
   KXFUnarchiverDelegate* const formerDelegate = unarchiver.delegate();
@@ -8,7 +22,7 @@ std::optional<std::vector<std::uint8_t>> KXFFileExtractHelper::extractDataForFil
   std::optional<std::vector<std::uint8_t>> found;
   const bool walked = unarchiver.enumerateFilesWithBlock(
       [&](const std::string& name, std::vector<std::uint8_t>& bytes, bool& stop) {
-        if (name != fileToExtract_) return;
+        if (!sameEntryName(name, fileToExtract_)) return;
         found = std::move(bytes);
         stop = true;
       });
@@ -19,5 +33,5 @@ std::optional<std::vector<std::uint8_t>> KXFFileExtractHelper::extractDataForFil
 
 void KXFFileExtractHelper::unarchiverWillUnarchiveFileTo(KXFUnarchiver&, const std::string& fileName, bool,
                                                          bool& shouldSkip, bool&) {
-  if (fileName != fileToExtract_) shouldSkip = true;
+  if (!sameEntryName(fileName, fileToExtract_)) shouldSkip = true;
 }

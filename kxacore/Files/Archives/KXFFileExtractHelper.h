@@ -18,13 +18,13 @@ class KXFFileExtractHelper : public KXFUnarchiverDelegate {
   [[nodiscard]] const std::string& fileToExtract() const noexcept { return fileToExtract_; }
   void setFileToExtract(std::string_view name) { fileToExtract_ = std::string(name); }
 
-  // The bytes of the entry named `fileName` (after the '\' to '/' change);
+  // The bytes of the entry named `fileName` ('\' and '/' count as equal);
   // none when the walk failed or no entry has that name. Errors of the walk
   // are not forwarded to the former delegate.
   [[nodiscard]] std::optional<std::vector<std::uint8_t>> extractDataForFile(std::string_view fileName,
                                                                             KXFUnarchiver& unarchiver);
 
-  // Skips every entry whose name is not fileToExtract().
+  // Skips every entry whose name is not fileToExtract() ('\' and '/' count as equal).
   void unarchiverWillUnarchiveFileTo(KXFUnarchiver& unarchiver, const std::string& fileName, bool isDirectory,
                                      bool& shouldSkip, bool& shouldStop) override;
 
