@@ -2,6 +2,7 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
@@ -15,6 +16,7 @@ namespace {
 
 constexpr std::size_t kChunkSize = 4096;
 constexpr std::uint64_t kZip64Threshold = 0xFFFFFFFFull;
+constexpr unsigned long kUTF8NameFlag = 0x800;
 
 struct FileCloser {
   void operator()(std::FILE* file) const noexcept { std::fclose(file); }
@@ -114,6 +116,9 @@ bool KXFArchiver::addFileToArchiveAtPath(const std::filesystem::path& sourcePath
   const zip_fileinfo info = entryInfoFor(haveStatus ? &status : nullptr);
   const int zip64 = size >= kZip64Threshold ? 1 : 0;
   const std::string name(entryName);
+  // Bit 11 tells readers the name is UTF-8; without it they assume code page 437.
+  const bool asciiName = std::all_of(name.begin(), name.end(), [](char c) { return (c & 0x80) == 0; });
+  const unsigned long flags = asciiName ? 0 : kUTF8NameFlag;
 
   UniqueFile source(std::fopen(sourcePath.c_str(), "rb"));
   const bool encrypt = password_ && !password_->empty();
@@ -125,15 +130,16 @@ bool KXFArchiver::addFileToArchiveAtPath(const std::filesystem::path& sourcePath
     }
     const int opened = zipOpenNewFileInZip4_64(zipFile_.get(), name.c_str(), &info, nullptr, 0, nullptr, 0, nullptr,
                                                Z_DEFLATED, level_, 1, -MAX_WBITS, 8, Z_DEFAULT_STRATEGY, nullptr, 0,
-                                               0, kKXFZipEncryptedFlag, zip64);
+                                               0, kKXFZipEncryptedFlag | flags, zip64);
     if (opened != ZIP_OK) {
       reportCannotAdd(opened, entryName);
       return false;
     }
     return writeEncryptedEntry(source.get(), size, *crc, entryName, userFileName);
   }
-  const int opened = zipOpenNewFileInZip64(zipFile_.get(), name.c_str(), &info, nullptr, 0, nullptr, 0, nullptr,
-                                           Z_DEFLATED, level_, zip64);
+  const int opened = zipOpenNewFileInZip4_64(zipFile_.get(), name.c_str(), &info, nullptr, 0, nullptr, 0, nullptr,
+                                             Z_DEFLATED, level_, 0, -MAX_WBITS, 8, Z_DEFAULT_STRATEGY, nullptr, 0, 0,
+                                             flags, zip64);
   if (opened != ZIP_OK) {
     reportCannotAdd(opened, entryName);
     return false;
