@@ -137,15 +137,16 @@ bool KXFArchiver::addFileToArchiveAtPath(const std::filesystem::path& sourcePath
     }
     return writeEncryptedEntry(source.get(), size, *crc, entryName, userFileName);
   }
+  // An unreadable source is refused before its entry exists, so no empty entry is left behind.
+  if (!source) {
+    reportCannotAdd(errno, entryName);
+    return false;
+  }
   const int opened = zipOpenNewFileInZip4_64(zipFile_.get(), name.c_str(), &info, nullptr, 0, nullptr, 0, nullptr,
                                              Z_DEFLATED, level_, 0, -MAX_WBITS, 8, Z_DEFAULT_STRATEGY, nullptr, 0, 0,
                                              flags, zip64);
   if (opened != ZIP_OK) {
     reportCannotAdd(opened, entryName);
-    return false;
-  }
-  if (!source) {
-    reportCannotAdd(errno, entryName);
     return false;
   }
   return writePlainEntry(source.get(), size, entryName, userFileName);

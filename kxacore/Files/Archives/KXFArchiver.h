@@ -23,7 +23,8 @@ class KXFArchiverDelegate {
  public:
   virtual ~KXFArchiverDelegate() = default;
   // An entry could not be added: `code` is minizip's result, -1 when the
-  // source could not be read for its CRC, or an errno value while streaming.
+  // source could not be read for its CRC (with a password), or an errno value
+  // when it cannot be opened or read (without one; no entry is added then).
   virtual void archiverDidRaiseError(KXFArchiver& archiver, std::int64_t code, const std::string& description);
   // Progress of one file, at most about 100 times per file; setting
   // `shouldStop` ends the entry early (it is kept, shortened).

@@ -126,6 +126,16 @@ TEST_F(KXFArchiverTests, FailuresAreReportedWithTheEntryName) {
   kxfWriteFile(folder_ / "x", "x");
   EXPECT_FALSE(archiver->addFileToArchiveAtPath(folder_ / "x", "x"));
   EXPECT_EQ(KXFArchiver::forPath(folder_ / "no" / "such" / "folder.zip"), nullptr);
+
+  // Without a password the missing source is refused before an entry exists.
+  auto plain = KXFArchiver::forPath(folder_ / "plain.zip");
+  RecordingArchiverDelegate plainDelegate;
+  plain->setDelegate(&plainDelegate);
+  EXPECT_FALSE(plain->addFileToArchiveAtPath(folder_ / "missing", "missing.txt"));
+  EXPECT_TRUE(plain->addFileToArchiveAtPath(folder_ / "x", "x"));
+  EXPECT_TRUE(plain->close());
+  EXPECT_EQ(plainDelegate.errorCodes, std::vector<std::int64_t>{ENOENT});
+  EXPECT_EQ(readAll(folder_ / "plain.zip"), (std::map<std::string, std::string>{{"x", "x"}}));
 }
 
 TEST_F(KXFArchiverTests, ModificationDatesRoundTrip) {
