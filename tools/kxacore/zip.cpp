@@ -206,7 +206,8 @@ void runExtract(const ZipOptions& options) {
   ReadingDelegate delegate(options.json, bar);
   unarchiver->setDelegate(&delegate);
   const bool finished = unarchiver->unarchiveFileTo(options.destination);
-  const std::size_t failed = reportEntries(entries, delegate.failures(), options.json) + (finished ? 0 : 1);
+  std::size_t failed = reportEntries(entries, delegate.failures(), options.json);
+  if (!finished && failed == 0) failed = 1;
   if (options.json) printSummary(options.archive, entries.size(), failed);
   finish(failed);
 }
@@ -218,7 +219,8 @@ void runTest(const ZipOptions& options) {
   ReadingDelegate delegate(options.json, bar);
   unarchiver->setDelegate(&delegate);
   const bool finished = unarchiver->enumerateFilesWithBlock([](const std::string&, std::vector<std::uint8_t>&, bool&) {});
-  const std::size_t failed = reportEntries(entries, delegate.failures(), options.json) + (finished ? 0 : 1);
+  std::size_t failed = reportEntries(entries, delegate.failures(), options.json);
+  if (!finished && failed == 0) failed = 1;
   if (options.json) {
     printSummary(options.archive, entries.size(), failed);
   } else if (failed == 0) {
