@@ -39,7 +39,7 @@ KXAImage::KXAImage(std::size_t width, std::size_t height, KXAPixelLayout layout,
 }
 
 std::optional<KXAImage> KXAImage::imageWithContentsOfFile(const std::filesystem::path& path,
-                                                          bool forceColour, std::string* error) {
+                                                          Load mode, std::string* error) {
   if (!startVips()) {
     setError(error, "the image library could not start");
     return std::nullopt;
@@ -47,13 +47,9 @@ std::optional<KXAImage> KXAImage::imageWithContentsOfFile(const std::filesystem:
   try {
     vips::VImage image = vips::VImage::new_from_file(
         path.c_str(), vips::VImage::option()->set("access", VIPS_ACCESS_SEQUENTIAL));
-    const bool grey = image.bands() == 1 && !forceColour &&
-                      image.interpretation() != VIPS_INTERPRETATION_MULTIBAND;
-    if (grey || image.bands() <= 2) {
-      image = image.colourspace(grey ? VIPS_INTERPRETATION_B_W : VIPS_INTERPRETATION_sRGB);
-    } else {
-      image = image.colourspace(VIPS_INTERPRETATION_sRGB);
-    }
+    const bool grey = mode == Load::grey || (mode == Load::asStored && image.bands() == 1);
+    // Converting the colour space also brings 16-bit files to 8 bits.
+    image = image.colourspace(grey ? VIPS_INTERPRETATION_B_W : VIPS_INTERPRETATION_sRGB);
     if (image.format() != VIPS_FORMAT_UCHAR) image = image.cast(VIPS_FORMAT_UCHAR);
     if (!grey) {
       if (image.bands() == 3) image = image.bandjoin_const({255});

@@ -35,12 +35,17 @@ class KXAImage {
   const std::uint8_t* row(std::size_t y) const { return bytes_.data() + y * rowBytes_; }
   bool empty() const { return width_ == 0 || height_ == 0; }
 
-  // Reads any image libvips can decode (PNG, JPEG ...). One band stays grey8
-  // (unless forceColour); everything else becomes argb32, with alpha 255
-  // where the file has none. nullopt when the file cannot be read or
-  // decoded; `error` then says why.
+  enum class Load {
+    asStored,  // one band (grey, with or without alpha dropped) stays grey8, the rest argb32
+    colour,    // always argb32
+    grey,      // always grey8 (colour converted to luminance, alpha dropped)
+  };
+
+  // Reads any image libvips can decode (PNG, JPEG ...), 8 bits a sample,
+  // sRGB; argb32 gets alpha 255 where the file has none. nullopt when the
+  // file cannot be read or decoded; `error` then says why.
   [[nodiscard]] static std::optional<KXAImage> imageWithContentsOfFile(
-      const std::filesystem::path& path, bool forceColour = false, std::string* error = nullptr);
+      const std::filesystem::path& path, Load mode = Load::asStored, std::string* error = nullptr);
 
   // Writes the image in the format its extension names (".png", ".jpg" ...),
   // replacing the file atomically. JPEG drops alpha. False (with `error`)
