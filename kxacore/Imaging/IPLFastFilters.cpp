@@ -40,9 +40,15 @@ void boxRunning(const std::uint8_t* block, std::size_t count, std::size_t radius
     const std::uint8_t* row = block + i * lanes;
     for (std::size_t l = 0; l < lanes; ++l) sums[l] = static_cast<Sum>(sums[l] + row[l]);
   }
+  const bool multiply = radius <= RoundedDivider::kMaximumRadius;
+  const RoundedDivider divide(multiply ? radius : 0);
   for (std::size_t y = 0; y < count; ++y) {
     std::uint8_t* target = out + y * lanes;
-    for (std::size_t l = 0; l < lanes; ++l) target[l] = table[sums[l]];
+    if (multiply) {
+      for (std::size_t l = 0; l < lanes; ++l) target[l] = divide(sums[l]);
+    } else {
+      for (std::size_t l = 0; l < lanes; ++l) target[l] = table[sums[l]];
+    }
     if (y + 1 == count) break;
     const std::uint8_t* entering = block + (y + 2 * radius + 1) * lanes;
     const std::uint8_t* leaving = block + y * lanes;

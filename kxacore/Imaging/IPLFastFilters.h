@@ -17,6 +17,21 @@ struct Plane {
   std::size_t sourceRowBytes, destinationRowBytes;
 };
 
+// round(sum / (2r + 1)) as a multiply and shift, for windows whose sums
+// vectorise: exact for every window sum of 8-bit samples when r <= 90, since
+// then sum * e < 2^23 for the rounding error e of the multiplier.
+struct RoundedDivider {
+  static constexpr std::size_t kMaximumRadius = 90;
+  static constexpr unsigned kShift = 23;
+  std::uint32_t radius, multiplier;
+  explicit RoundedDivider(std::size_t r)
+      : radius(static_cast<std::uint32_t>(r)),
+        multiplier(static_cast<std::uint32_t>(((std::uint32_t{1} << kShift) + 2 * r) / (2 * r + 1))) {}
+  std::uint8_t operator()(std::uint32_t sum) const {
+    return static_cast<std::uint8_t>(((sum + radius) * multiplier) >> kShift);
+  }
+};
+
 void fastBoxBlur(const Plane& plane, std::size_t radius, const std::uint8_t* divisionTable);
 void fastErode(const Plane& plane, std::size_t radius);
 void fastDilate(const Plane& plane, std::size_t radius);

@@ -1,6 +1,7 @@
 // The fast blur family against the plain line-by-line forms, and the few
 // outputs worth pinning by value.
 
+#include "kxacore/Imaging/IPLFastFilters.h"
 #include "kxacore/Imaging/IPLPixelOperations.h"
 #include "kxacore/Imaging/IPLReference.h"
 
@@ -189,6 +190,19 @@ TEST(BlurFamily, DivisionTableRoundsToNearest) {
   EXPECT_EQ(thirds[4], 1);  // 1.33
   EXPECT_EQ(thirds[5], 2);  // 1.67
   EXPECT_EQ(thirds[765], 255);
+}
+
+}  // namespace
+
+namespace {
+
+TEST(BlurFamily, MultiplyShiftDivisionMatchesTheTableForEveryWindowSum) {
+  for (std::size_t radius = 0; radius <= kxa::ipl::RoundedDivider::kMaximumRadius; ++radius) {
+    const auto table = kxa::ipl::makeDivisionTable(radius);
+    const kxa::ipl::RoundedDivider divide(radius);
+    for (std::uint32_t sum = 0; sum < table.size(); ++sum)
+      ASSERT_EQ(divide(sum), table[sum]) << "radius " << radius << " sum " << sum;
+  }
 }
 
 }  // namespace
