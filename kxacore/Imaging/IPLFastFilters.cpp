@@ -133,22 +133,24 @@ void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
   constexpr bool morphology = kind != Kind::box;
   Scratch scratch;
 
-  // Rows: one lane, the line read whole before the destination row is written.
-  scratch.reserve(width + 2 * radius, 1, morphology);
-  for (std::size_t y = 0; y < height; ++y) {
-    const std::uint8_t* in = plane.source + y * plane.sourceRowBytes;
-    std::uint8_t* line = scratch.block.data() + radius;
-    if (plane.sourceStep == 1) {
-      std::copy_n(in, width, line);
-    } else {
-      for (std::size_t x = 0; x < width; ++x) line[x] = in[x * plane.sourceStep];
+  // Rows, kStrip rows at once: the strip is transposed into the block so the
+  // same lane-parallel loops run along the rows. Every source row of the
+  // strip is read before any destination row is written.
+  scratch.reserve(width + 2 * radius, kStrip, morphology);
+  for (std::size_t first = 0; first < height; first += kStrip) {
+    const std::size_t used = std::min(kStrip, height - first);
+    std::uint8_t* block = scratch.block.data() + radius * kStrip;
+    for (std::size_t lane = 0; lane < used; ++lane) {
+      const std::uint8_t* in = plane.source + (first + lane) * plane.sourceRowBytes;
+      for (std::size_t x = 0; x < width; ++x) block[x * kStrip + lane] = in[x * plane.sourceStep];
     }
-    filterBlock<kind, 1>(scratch, width, radius, table);
-    std::uint8_t* out = plane.destination + y * plane.destinationRowBytes;
-    if (plane.destinationStep == 1) {
-      std::copy_n(scratch.out.data(), width, out);
-    } else {
-      for (std::size_t x = 0; x < width; ++x) out[x * plane.destinationStep] = scratch.out[x];
+    for (std::size_t lane = used; lane < kStrip; ++lane)
+      for (std::size_t x = 0; x < width; ++x) block[x * kStrip + lane] = 0;
+    filterBlock<kind, kStrip>(scratch, width, radius, table);
+    for (std::size_t lane = 0; lane < used; ++lane) {
+      std::uint8_t* out = plane.destination + (first + lane) * plane.destinationRowBytes;
+      const std::uint8_t* filtered = scratch.out.data() + lane;
+      for (std::size_t x = 0; x < width; ++x) out[x * plane.destinationStep] = filtered[x * kStrip];
     }
   }
 
