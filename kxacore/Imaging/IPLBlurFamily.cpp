@@ -1,6 +1,4 @@
-// Public entry points of the blur family: the fast forms for the box blur
-// and the morphology, the plain line passes for the repeated 3-tap blur
-// (whose cost is inherently radius passes per line).
+// Public entry points of the blur family, on the fast forms.
 
 #include "kxacore/Imaging/IPLFastFilters.h"
 #include "kxacore/Imaging/IPLPixelOperations.h"
@@ -22,13 +20,7 @@ std::size_t effectiveMorphologyRadius(const Plane& plane, std::size_t radius) {
 
 bool blurRadiusAccepted(std::size_t radius) { return radius <= IPLMaximumBlurRadius; }
 
-void gaussian(const Plane& plane, std::size_t radius) {
-  std::vector<std::uint8_t> buffer(std::max(plane.width, plane.height) + 2 * radius + 1);
-  const auto table = kxa::ipl::makeDivisionTable(1);
-  _IPLGaussianBlur(plane.source, plane.destination, plane.width, plane.height, plane.sourceStep,
-                   plane.destinationStep, plane.sourceRowBytes, plane.destinationRowBytes,
-                   radius, buffer.data(), table.data());
-}
+void gaussian(const Plane& plane, std::size_t radius) { kxa::ipl::fastGaussianBlur(plane, radius); }
 
 void box(const Plane& plane, std::size_t radius) {
   const auto table = kxa::ipl::makeDivisionTable(radius);

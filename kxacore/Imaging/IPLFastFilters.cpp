@@ -93,7 +93,30 @@ void vanHerk(const std::uint8_t* block, std::size_t length, std::size_t radius,
   }
 }
 
-enum class Kind { box, erode, dilate };
+// `passes` rounds of the rounded 3-tap mean over a padded block; the first
+// and last rows stay as they are (their influence never reaches the output
+// rows, which sit `passes` rows inside the padding).
+template <std::size_t lanes>
+void repeatedThreeTap(std::uint8_t* block, std::size_t length, std::size_t passes,
+                      std::uint8_t* out, std::size_t count) {
+  const RoundedDivider third(1);
+  std::uint8_t previous[lanes];
+  for (std::size_t pass = 0; pass < passes; ++pass) {
+    std::copy_n(block, lanes, previous);
+    for (std::size_t i = 1; i + 1 < length; ++i) {
+      std::uint8_t* row = block + i * lanes;
+      const std::uint8_t* next = row + lanes;
+      for (std::size_t l = 0; l < lanes; ++l) {
+        const std::uint8_t current = row[l];
+        row[l] = third(static_cast<std::uint32_t>(previous[l]) + current + next[l]);
+        previous[l] = current;
+      }
+    }
+  }
+  std::copy_n(block + passes * lanes, count * lanes, out);
+}
+
+enum class Kind { box, gaussian, erode, dilate };
 
 struct Scratch {
   std::vector<std::uint8_t> block, prefix, suffix, out;
@@ -111,7 +134,10 @@ template <Kind kind, std::size_t lanes>
 void filterBlock(Scratch& scratch, std::size_t count, std::size_t radius,
                  const std::uint8_t* table) {
   std::uint8_t* block = scratch.block.data();
-  if constexpr (kind == Kind::box) {
+  if constexpr (kind == Kind::gaussian) {
+    mirrorRows(block, count, radius, lanes);
+    repeatedThreeTap<lanes>(block, count + 2 * radius, radius, scratch.out.data(), count);
+  } else if constexpr (kind == Kind::box) {
     mirrorRows(block, count, radius, lanes);
     // 16-bit sums suffice up to a window of 257 samples.
     if (2 * radius + 1 <= 257) {
@@ -130,7 +156,7 @@ template <Kind kind>
 void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
   const std::size_t width = plane.width, height = plane.height;
   if (width == 0 || height == 0) return;
-  constexpr bool morphology = kind != Kind::box;
+  constexpr bool morphology = kind == Kind::erode || kind == Kind::dilate;
   Scratch scratch;
 
   // Rows, kStrip rows at once: the strip is transposed into the block so the
@@ -187,6 +213,10 @@ void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
 
 void fastBoxBlur(const Plane& plane, std::size_t radius, const std::uint8_t* divisionTable) {
   run<Kind::box>(plane, radius, divisionTable);
+}
+
+void fastGaussianBlur(const Plane& plane, std::size_t radius) {
+  run<Kind::gaussian>(plane, radius, nullptr);
 }
 
 void fastErode(const Plane& plane, std::size_t radius) { run<Kind::erode>(plane, radius, nullptr); }

@@ -1,6 +1,7 @@
-// Fast forms of the box blur, erosion and dilation: O(1) work per sample
-// whatever the radius, columns processed as strips of neighbouring columns so
-// that every memory access runs along rows. Byte-identical to the plain
+// Fast forms of the blur family: O(1) work per sample whatever the radius
+// (except the repeated 3-tap blur, radius passes by definition). Rows and
+// columns are processed as strips of 64 neighbouring lines laid side by side,
+// so the inner loops run over 64 independent lanes and vectorise. Byte-identical to the plain
 // forms in IPLReference.h (the tests compare them). Internal.
 #pragma once
 
@@ -33,6 +34,8 @@ struct RoundedDivider {
 };
 
 void fastBoxBlur(const Plane& plane, std::size_t radius, const std::uint8_t* divisionTable);
+// The repeated 3-tap blur: still radius passes, but over 64 lanes at once.
+void fastGaussianBlur(const Plane& plane, std::size_t radius);
 void fastErode(const Plane& plane, std::size_t radius);
 void fastDilate(const Plane& plane, std::size_t radius);
 
