@@ -87,7 +87,8 @@ void IPLDilate(const uint8_t *source, uint8_t *destination, size_t width,
 
 /* Optional erosion (0) or dilation (1), then optional box (0) or repeated
  * 3-tap (1) blur of the result; any other selector skips that step. The
- * blur reads the destination when a morphology ran. In place. */
+ * blur reads the destination when a morphology ran. With a blur selected and
+ * a radius above IPLMaximumBlurRadius nothing is written. In place. */
 void IPLBlur(const uint8_t *source, uint8_t *destination, size_t width,
              size_t height, size_t sourceStep, size_t destinationStep,
              size_t sourceRowBytes, size_t destinationRowBytes, size_t radius,
