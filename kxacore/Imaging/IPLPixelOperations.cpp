@@ -53,7 +53,11 @@ void applyTables(const std::uint8_t* source, std::uint8_t* destination, std::siz
                });
 }
 
-inline float clampUnit(float value) { return std::max(std::min(value, 1.0f), 0.0f); }
+// At most 1, then at least 0; NaN (from NaN amounts) counts as 0.
+inline float clampUnit(float value) {
+  if (value > 1.0f) return 1.0f;
+  return value >= 0.0f ? value : 0.0f;
+}
 
 // round() of the C library rounds halves away from zero, as the tables want.
 inline std::uint8_t levelFromUnit(float value) {
@@ -190,9 +194,10 @@ void IPLApplyCustomLUTTo32BitARGBImage(const uint8_t* source, uint8_t* destinati
                                        float amount) {
   if (width == 0 || height == 0) return;
   constexpr double kRadiansPerDegree = 0.017453292519943295;
-  const float kRed = static_cast<float>(std::cos(angle * kRadiansPerDegree) * amount);
-  const float kGreen = static_cast<float>(std::cos((angle - 120) * kRadiansPerDegree) * amount);
-  const float kBlue = static_cast<float>(std::cos((angle - 240) * kRadiansPerDegree) * amount);
+  const double degrees = angle;  // in double: angle - 240 must not overflow an int
+  const float kRed = static_cast<float>(std::cos(degrees * kRadiansPerDegree) * amount);
+  const float kGreen = static_cast<float>(std::cos((degrees - 120) * kRadiansPerDegree) * amount);
+  const float kBlue = static_cast<float>(std::cos((degrees - 240) * kRadiansPerDegree) * amount);
   std::array<std::uint8_t, 256> red{}, green{}, blue{};
   for (unsigned i = 0; i < 256; ++i) {
     const float x = static_cast<float>(i) / 255.0f;

@@ -198,6 +198,10 @@ TEST(PixelOperations, ToneLimitsTheAmountsAndReturnsThem) {
   const IPLToneAmounts raw =
       IPLApplyToneLUTTo32BitARGBImage(image.data(), image.data(), 1, 1, 4, 4, 1, 0.5f, 0.5f);
   EXPECT_EQ(raw.brightness, 0.5f);
+  // NaN amounts give a defined (black) curve rather than undefined casts.
+  std::vector<std::uint8_t> grey(4, 128);
+  IPLApplyToneLUTTo32BitARGBImage(grey.data(), grey.data(), 1, 1, 4, 4, 1, NAN, 0.0f);
+  EXPECT_EQ(grey, (std::vector<std::uint8_t>{128, 0, 0, 0}));
   // Zero amounts leave every level as it was.
   std::vector<std::uint8_t> ramp(1024);
   for (std::size_t i = 0; i < ramp.size(); ++i) ramp[i] = static_cast<std::uint8_t>(i / 4);
