@@ -55,7 +55,8 @@ class KXGIdTable {
   KXGIdTable();
 
   // The key's number, and whether it was added by this call. Any bytes,
-  // of any length, are a key (the empty string too).
+  // of any length, are a key (the empty string too). Throws
+  // std::length_error past 4294967294 keys (numbers are 32-bit).
   std::pair<std::uint32_t, bool> intern(std::string_view key);
   // The key numbered `index` (must be below size()).
   [[nodiscard]] std::string_view text(std::uint32_t index) const noexcept;
