@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <bit>
 #include <limits>
 #include <optional>
 #include <unordered_map>
@@ -12,6 +13,7 @@
 #include "kxacore/Data/Places/KXDPlaceName.h"
 #include "kxacore/Extensions/KXAStringExtensions.h"
 #include "kxacore/Gedcom/KXGDateReader.h"
+#include "kxacore/Gedcom/KXGIdTable.h"
 
 namespace {
 
@@ -20,7 +22,6 @@ constexpr std::size_t kValueCacheCapacity = 65536;
 constexpr double kDaysPerYear = 365.2425;
 
 enum class Kind : std::uint8_t { kUndefined, kIndividual, kFamily, kOther };
-enum class Role : std::uint8_t { kSpouse, kChild };
 
 struct TransparentHash {
   using is_transparent = void;
@@ -43,20 +44,26 @@ struct EventSpan {
   [[nodiscard]] bool known() const noexcept { return text != kNone; }
 };
 
+// The events kept per individual, in the order they are stored.
+enum Event : unsigned { kBirth, kBaptism, kDeath, kBurial, kEventCount };
+
+// Most individuals have one or two dated events of four, so only the known
+// ones are stored, one record's after the other in a shared list.
 struct Individual {
   std::uint32_t id = kNone;
-  EventSpan birth, baptism, death, burial;
+  std::uint32_t firstEvent = 0;  // into the event list
+  std::uint8_t events = 0;       // bit per Event that is known
 };
 
 struct Family {
   std::uint32_t id = kNone;
   std::uint32_t husband = kNone;  // id indices
   std::uint32_t wife = kNone;
-  EventSpan marriage;
+  std::uint32_t marriage = kNone;  // into the event list
 };
 
 struct IdEntry {
-  std::uint64_t line = 0;
+  std::uint32_t line = 0;       // saturated beyond 2^32 - 1
   std::uint32_t index = kNone;  // into individuals or families
   Kind kind = Kind::kUndefined;
   std::uint8_t tag = 0;         // the record's tag, for messages (interned)
@@ -69,13 +76,15 @@ struct PendingPointer {
   std::uint16_t tag = 0;
 };
 
-// One side of an individual-family link.
-struct Link {
+// One side of an individual-family link. Packed: there are about two per
+// record, and 13 bytes instead of 16 is 6 bytes a record.
+struct [[gnu::packed]] Link {
   std::uint32_t family = 0;  // id indices
   std::uint32_t individual = 0;
   std::uint32_t line = 0;    // saturated beyond 2^32 - 1
-  Role role = Role::kSpouse;
-  bool fromFamily = false;
+  bool child : 1 = false;       // FAMC or CHIL, else a spouse
+  bool fromFamily : 1 = false;  // HUSB, WIFE or CHIL
+  bool paired : 1 = false;      // the other side exists (set at the end)
 };
 
 std::uint32_t compactLine(std::uint64_t line) {
@@ -164,12 +173,18 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   StringMap<std::uint8_t> nameCache;   // bit 1: empty
   StringMap<std::uint8_t> placeCache;  // bit 1: unstorable, 2: more than five levels
 
-  StringMap<std::uint32_t> idIndex;
-  std::vector<IdEntry> ids;
-  std::vector<Individual> individuals;
-  std::vector<Family> families;
+  KXGIdTable idTable;
+  KXGChunkedVector<IdEntry> ids;
+  KXGChunkedVector<Individual> individuals;
+  KXGChunkedVector<Family> families;
+  KXGChunkedVector<EventSpan> events;
   std::vector<PendingPointer> pending;
-  std::vector<Link> links;
+  std::size_t pendingAfterPrune = 0;
+  KXGChunkedVector<Link> links;
+  // The dated events of the record being read (a family's marriage is the
+  // first), stored when the record ends.
+  std::array<EventSpan, kEventCount> recordEvents{};
+  std::uint8_t recordEventMask = 0;
   std::vector<std::string> tags;  // interned tags of pending pointers
   std::vector<std::string> recordTags;  // at most 256; the last stands for the rest
   // Dates of events as written, for messages; events share equal texts.
@@ -213,10 +228,8 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   // ---- Ids ---------------------------------------------------------------
 
   std::uint32_t internId(std::string_view id) {
-    if (const auto found = idIndex.find(id); found != idIndex.end()) return found->second;
-    const auto index = static_cast<std::uint32_t>(ids.size());
-    ids.emplace_back();
-    idIndex.emplace(std::string(id), index);
+    const auto [index, added] = idTable.intern(id);
+    if (added) ids.push_back({});
     return index;
   }
 
@@ -266,27 +279,29 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     if (!root.xref.empty()) {
       self = internId(root.xref);
       IdEntry& entry = ids[self];
-      if (entry.kind != Kind::kUndefined) {
+      const bool duplicate = entry.kind != Kind::kUndefined;
+      if (duplicate) {
         emit(root.number, "id-duplicate",
              "The id " + root.xref + " is already used by the " + tagName(entry.tag) +
                  " record on line " + std::to_string(entry.line) + ".",
              root.tag, root.xref);
       } else {
         entry.kind = kind;
-        entry.line = root.number;
+        entry.line = compactLine(root.number);
         entry.tag = internTag(root.tag);
         if (kind == Kind::kIndividual) {
           entry.index = static_cast<std::uint32_t>(individuals.size());
-          individuals.push_back({self, {}, {}, {}, {}});
+          individuals.push_back({self, 0, 0});
         } else if (kind == Kind::kFamily) {
           entry.index = static_cast<std::uint32_t>(families.size());
-          families.push_back({self, kNone, kNone, {}});
+          families.push_back({self, kNone, kNone, kNone});
         }
       }
       // A duplicate record is still read for its values, but not linked.
-      if (entry.line != root.number) self = kNone;
+      if (duplicate) self = kNone;
     }
 
+    recordEventMask = 0;
     const std::span<const KXGLine> lines = record.lines();
     for (std::size_t i = 0; i < lines.size(); ++i) {
       const KXGLine& line = lines[i];
@@ -301,6 +316,32 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
         checkPointer(line, kind, self);
       }
     }
+    keepRecordEvents(kind, self);
+  }
+
+  void keepRecordEvents(Kind kind, std::uint32_t self) {
+    if (self == kNone || recordEventMask == 0) return;
+    const auto first = static_cast<std::uint32_t>(events.size());
+    for (unsigned event = 0; event < kEventCount; ++event) {
+      if ((recordEventMask & (1u << event)) != 0) events.push_back(recordEvents[event]);
+    }
+    if (kind == Kind::kIndividual) {
+      Individual& person = individuals[ids[self].index];
+      person.firstEvent = first;
+      person.events = recordEventMask;
+    } else {
+      families[ids[self].index].marriage = first;
+    }
+  }
+
+  EventSpan eventOf(const Individual& person, Event event) const {
+    const unsigned bit = 1u << event;
+    if ((person.events & bit) == 0) return {};
+    return events[person.firstEvent + static_cast<unsigned>(std::popcount(person.events & (bit - 1)))];
+  }
+
+  EventSpan marriageOf(const Family& family) const {
+    return family.marriage == kNone ? EventSpan{} : events[family.marriage];
   }
 
   void checkHeader(const KXGRecord& record) {
@@ -343,8 +384,10 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
                       line.tag, line.value});
     }
     if (!reading.hasSpan || self == kNone || parent == nullptr || parent->level != 1) return;
-    const auto keep = [&](EventSpan& slot) {
-      if (slot.known()) return;
+    const auto keep = [&](Event event) {
+      if ((recordEventMask & (1u << event)) != 0) return;
+      recordEventMask = static_cast<std::uint8_t>(recordEventMask | (1u << event));
+      EventSpan& slot = recordEvents[event];
       slot.earliest = static_cast<std::int32_t>(
           std::clamp(reading.earliest, KXGDateReading::kOpenStart, KXGDateReading::kOpenEnd));
       slot.latest = static_cast<std::int32_t>(
@@ -354,13 +397,12 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     };
     const std::string& event = parent->tag;
     if (kind == Kind::kIndividual) {
-      Individual& person = individuals[ids[self].index];
-      if (event == "BIRT") keep(person.birth);
-      else if (event == "CHR" || event == "BAPM") keep(person.baptism);
-      else if (event == "DEAT") keep(person.death);
-      else if (event == "BURI") keep(person.burial);
+      if (event == "BIRT") keep(kBirth);
+      else if (event == "CHR" || event == "BAPM") keep(kBaptism);
+      else if (event == "DEAT") keep(kDeath);
+      else if (event == "BURI") keep(kBurial);
     } else if (kind == Kind::kFamily && event == "MARR") {
-      keep(families[ids[self].index].marriage);
+      keep(kBirth);  // a family's only kept event
     }
   }
 
@@ -446,21 +488,35 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
         tags.push_back(line.tag);
       }
       pending.push_back({target, compactLine(line.number), tagIndex});
+      if (pending.size() >= std::max<std::size_t>(4096, 2 * pendingAfterPrune)) prunePending();
     } else {
       checkPointerKind(line.number, line.tag, line.value, entry);
     }
     if (self == kNone || line.level != 1) return;
     if (kind == Kind::kIndividual && (line.tag == "FAMS" || line.tag == "FAMC")) {
       links.push_back({target, self, compactLine(line.number),
-                       line.tag == "FAMS" ? Role::kSpouse : Role::kChild, false});
+                       line.tag == "FAMC", false});
     } else if (kind == Kind::kFamily &&
                (line.tag == "HUSB" || line.tag == "WIFE" || line.tag == "CHIL")) {
       links.push_back({self, target, compactLine(line.number),
-                       line.tag == "CHIL" ? Role::kChild : Role::kSpouse, true});
+                       line.tag == "CHIL", true});
       Family& family = families[ids[self].index];
       if (line.tag == "HUSB" && family.husband == kNone) family.husband = target;
       if (line.tag == "WIFE" && family.wife == kNone) family.wife = target;
     }
+  }
+
+  // Forward pointers are the rule (a person's FAMS before the family), so
+  // drop those whose target has since been defined with the right kind: the
+  // end would find nothing to say about them. The rest keep their order.
+  void prunePending() {
+    std::erase_if(pending, [this](const PendingPointer& pointer) {
+      const Kind target = ids[pointer.target].kind;
+      if (target == Kind::kUndefined) return false;
+      const Kind expected = pointer.tag < tags.size() ? expectedKind(tags[pointer.tag]) : Kind::kUndefined;
+      return expected == Kind::kUndefined || expected == target;
+    });
+    pendingAfterPrune = pending.size();
   }
 
   void checkPointerKind(std::uint64_t line, std::string_view tag, std::string_view value,
@@ -496,14 +552,8 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
     checkFamilies();
   }
 
-  // Id texts by index, built once at the end for messages.
-  std::vector<std::string_view> idTexts;
-  std::string_view idOf(std::uint32_t id) {
-    if (idTexts.empty() && !ids.empty()) {
-      idTexts.resize(ids.size());
-      for (const auto& [text, index] : idIndex) idTexts[index] = text;
-    }
-    return id < idTexts.size() ? idTexts[id] : std::string_view("?");
+  std::string_view idOf(std::uint32_t id) const {
+    return id < idTable.size() ? idTable.text(id) : std::string_view("?");
   }
 
   void checkPendingPointers() {
@@ -524,39 +574,55 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
 
   static std::uint64_t linkKey(const Link& link) {
     return (std::uint64_t{link.family} << 33) | (std::uint64_t{link.individual} << 1) |
-           (link.role == Role::kChild ? 1 : 0);
+           (link.child ? 1 : 0);
+  }
+
+  // Marks the links of one side whose other side exists. Sorted keys are
+  // smaller and faster than a hash set; one side at a time halves the peak.
+  void pairLinks(bool fromFamily) {
+    std::size_t count = 0;
+    for (std::size_t i = 0; i < links.size(); ++i) count += links[i].fromFamily != fromFamily ? 1 : 0;
+    std::vector<std::uint64_t> otherSide;
+    otherSide.reserve(count);  // exact: growing by doubling would raise the peak
+    for (std::size_t i = 0; i < links.size(); ++i) {
+      if (links[i].fromFamily != fromFamily) otherSide.push_back(linkKey(links[i]));
+    }
+    std::sort(otherSide.begin(), otherSide.end());
+    for (std::size_t i = 0; i < links.size(); ++i) {
+      Link& link = links[i];
+      if (link.fromFamily == fromFamily) {
+        link.paired = std::binary_search(otherSide.begin(), otherSide.end(), linkKey(link));
+      }
+    }
   }
 
   void checkLinks() {
-    // Sorted keys of each side: smaller and faster than hash sets here.
-    std::vector<std::uint64_t> familySide, individualSide;
-    for (const Link& link : links) (link.fromFamily ? familySide : individualSide).push_back(linkKey(link));
-    std::sort(familySide.begin(), familySide.end());
-    std::sort(individualSide.begin(), individualSide.end());
-    for (const Link& link : links) {
+    pairLinks(true);
+    pairLinks(false);
+    for (std::size_t i = 0; i < links.size(); ++i) {
+      const Link& link = links[i];
+      if (link.paired) continue;
       const IdEntry& family = ids[link.family];
       const IdEntry& person = ids[link.individual];
       // Missing or wrong targets are reported as such already.
       if (family.kind != Kind::kFamily || person.kind != Kind::kIndividual) continue;
-      const auto& other = link.fromFamily ? individualSide : familySide;
-      if (std::binary_search(other.begin(), other.end(), linkKey(link))) continue;
       const std::string familyId(idOf(link.family));
       const std::string personId(idOf(link.individual));
       std::string message;
       if (link.fromFamily) {
         message = "The family " + familyId + " lists " + personId + " as a " +
-                  (link.role == Role::kChild ? "child" : "spouse") + ", but " + personId +
+                  (link.child ? "child" : "spouse") + ", but " + personId +
                   " (line " + std::to_string(person.line) + ") has no " +
-                  (link.role == Role::kChild ? "FAMC " : "FAMS ") + familyId + ".";
+                  (link.child ? "FAMC " : "FAMS ") + familyId + ".";
       } else {
         message = personId + " names the family " + familyId + " as " +
-                  (link.role == Role::kChild ? "FAMC" : "FAMS") + ", but " + familyId +
+                  (link.child ? "FAMC" : "FAMS") + ", but " + familyId +
                   " (line " + std::to_string(family.line) + ") does not list " + personId +
-                  (link.role == Role::kChild ? " as a child." : " as a spouse.");
+                  (link.child ? " as a child." : " as a spouse.");
       }
       emit(link.line, "link-one-sided", std::move(message),
-           link.fromFamily ? (link.role == Role::kChild ? "CHIL" : "HUSB/WIFE")
-                           : (link.role == Role::kChild ? "FAMC" : "FAMS"),
+           link.fromFamily ? (link.child ? "CHIL" : "HUSB/WIFE")
+                           : (link.child ? "FAMC" : "FAMS"),
            link.fromFamily ? personId : familyId);
     }
   }
@@ -566,23 +632,27 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   }
 
   void checkIndividuals() {
-    for (const Individual& person : individuals) {
+    for (std::size_t i = 0; i < individuals.size(); ++i) {
+      const Individual& person = individuals[i];
+      if (person.events == 0) continue;
       const std::string id(idOf(person.id));
-      const auto& birth = person.birth;
-      const auto& death = person.death;
+      const EventSpan birth = eventOf(person, kBirth);
+      const EventSpan death = eventOf(person, kDeath);
+      const EventSpan baptism = eventOf(person, kBaptism);
+      const EventSpan burial = eventOf(person, kBurial);
       if (birth.known() && death.known() && birth.earliest > death.latest) {
         dateFinding(birth, "birth-after-death",
                     id + " is born (" + eventText(birth) + ") after dying (" + eventText(death) +
                         ", line " + std::to_string(death.line) + ").");
       }
-      if (birth.known() && person.baptism.known() && person.baptism.latest < birth.earliest) {
-        dateFinding(person.baptism, "baptism-before-birth",
-                    id + " is baptised (" + eventText(person.baptism) + ") before being born (" +
+      if (birth.known() && baptism.known() && baptism.latest < birth.earliest) {
+        dateFinding(baptism, "baptism-before-birth",
+                    id + " is baptised (" + eventText(baptism) + ") before being born (" +
                         eventText(birth) + ", line " + std::to_string(birth.line) + ").");
       }
-      if (death.known() && person.burial.known() && person.burial.latest < death.earliest) {
-        dateFinding(person.burial, "burial-before-death",
-                    id + " is buried (" + eventText(person.burial) + ") before dying (" +
+      if (death.known() && burial.known() && burial.latest < death.earliest) {
+        dateFinding(burial, "burial-before-death",
+                    id + " is buried (" + eventText(burial) + ") before dying (" +
                         eventText(death) + ", line " + std::to_string(death.line) + ").");
       }
       if (birth.known() && death.known() && birth.latest < KXGDateReading::kOpenEnd &&
@@ -603,11 +673,11 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   }
 
   void checkParent(const Individual& child, const Individual& parent, bool mother) {
-    const EventSpan& born = child.birth;
+    const EventSpan born = eventOf(child, kBirth);
     const std::string childId(idOf(child.id));
     const std::string parentId(idOf(parent.id));
     const std::string who = (mother ? "mother " : "father ") + parentId;
-    const EventSpan& parentBirth = parent.birth;
+    const EventSpan parentBirth = eventOf(parent, kBirth);
     if (parentBirth.known() && born.latest < KXGDateReading::kOpenEnd &&
         parentBirth.earliest > KXGDateReading::kOpenStart &&
         born.latest - parentBirth.earliest < yearsInDays(options.minParentAge)) {
@@ -630,7 +700,7 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
                       " (born " + eventText(parentBirth) + ", line " +
                       std::to_string(parentBirth.line) + ").");
     }
-    const EventSpan& parentDeath = parent.death;
+    const EventSpan parentDeath = eventOf(parent, kDeath);
     const std::int64_t grace = mother ? 0 : 366;
     if (parentDeath.known() && parentDeath.latest < KXGDateReading::kOpenEnd &&
         born.earliest > parentDeath.latest + grace) {
@@ -641,41 +711,48 @@ struct KXGChecker::Impl final : KXGReaderDelegate {
   }
 
   void checkSpouse(const Family& family, const Individual& spouse, bool wife) {
-    const EventSpan& married = family.marriage;
+    const EventSpan married = marriageOf(family);
+    const EventSpan spouseBirth = eventOf(spouse, kBirth);
+    const EventSpan spouseDeath = eventOf(spouse, kDeath);
     const std::string familyId(idOf(family.id));
     const std::string who = (wife ? "wife " : "husband ") + std::string(idOf(spouse.id));
-    if (spouse.birth.known() && married.latest < spouse.birth.earliest) {
+    if (spouseBirth.known() && married.latest < spouseBirth.earliest) {
       dateFinding(married, "marriage-before-birth",
                   "The family " + familyId + " marries (" + eventText(married) + ") before the " +
-                      who + " is born (" + eventText(spouse.birth) + ", line " +
-                      std::to_string(spouse.birth.line) + ").");
+                      who + " is born (" + eventText(spouseBirth) + ", line " +
+                      std::to_string(spouseBirth.line) + ").");
     }
-    if (spouse.death.known() && married.earliest > spouse.death.latest) {
+    if (spouseDeath.known() && married.earliest > spouseDeath.latest) {
       dateFinding(married, "marriage-after-death",
                   "The family " + familyId + " marries (" + eventText(married) + ") after the " +
-                      who + " died (" + eventText(spouse.death) + ", line " +
-                      std::to_string(spouse.death.line) + ").");
+                      who + " died (" + eventText(spouseDeath) + ", line " +
+                      std::to_string(spouseDeath.line) + ").");
     }
   }
 
   void checkFamilies() {
     // Children of each family, from either side of the link, once each.
     std::vector<std::pair<std::uint32_t, std::uint32_t>> children;  // family index, child id
-    for (const Link& link : links) {
-      if (link.role != Role::kChild || ids[link.family].kind != Kind::kFamily) continue;
-      children.emplace_back(ids[link.family].index, link.individual);
+    std::size_t count = 0;
+    for (std::size_t i = 0; i < links.size(); ++i) count += links[i].child ? 1 : 0;
+    children.reserve(count);
+    for (std::size_t i = 0; i < links.size(); ++i) {
+      const Link& link = links[i];
+      if (!link.child || ids[link.family].kind != Kind::kFamily) continue;
+      children.emplace_back(ids[link.family].index, std::uint32_t{link.individual});
     }
     std::sort(children.begin(), children.end());
     children.erase(std::unique(children.begin(), children.end()), children.end());
     for (const auto& [familyIndex, childId] : children) {
       const Individual* child = individualOf(childId);
-      if (child == nullptr || !child->birth.known()) continue;
+      if (child == nullptr || (child->events & (1u << kBirth)) == 0) continue;
       const Family& family = families[familyIndex];
       if (const Individual* mother = individualOf(family.wife)) checkParent(*child, *mother, true);
       if (const Individual* father = individualOf(family.husband)) checkParent(*child, *father, false);
     }
-    for (const Family& family : families) {
-      if (!family.marriage.known()) continue;
+    for (std::size_t i = 0; i < families.size(); ++i) {
+      const Family& family = families[i];
+      if (family.marriage == kNone) continue;
       if (const Individual* husband = individualOf(family.husband)) checkSpouse(family, *husband, false);
       if (const Individual* wife = individualOf(family.wife)) checkSpouse(family, *wife, true);
     }

@@ -254,6 +254,45 @@ TEST(KXGCheckerTest, FindingsCarryLineTagAndValue) {
   EXPECT_EQ(report.summary.lines, 6u);
 }
 
+// Each record's dates stay its own: out of order within the record, the
+// first dated event of a kind wins, a duplicate record's dates are dropped
+// and nothing carries over to the next record.
+TEST(KXGCheckerTest, DatesStayWithTheirRecord) {
+  const std::string text = gedcom(person("@I1@", event("DEAT", "1800") + event("BURI", "1790") +
+                                                     event("BIRT", "1850") + event("BIRT", "1700"),
+                                         "1 FAMS @F1@\n") +
+                                  person("@I2@", event("BIRT", "1900"), "1 FAMS @F1@\n") +
+                                  person("@I1@", event("DEAT", "1000")) +
+                                  "0 @F1@ FAM\n1 HUSB @I1@\n1 WIFE @I2@\n" + event("MARR", "1880"));
+  const KXGReport report = KXGChecker::reportForBytes(bytesOf(text));
+  std::vector<std::string> found;
+  for (const KXGFinding& f : report.findings) found.push_back(std::to_string(f.line) + " " + f.code);
+  EXPECT_EQ(found, (std::vector<std::string>{"19 id-duplicate", "10 birth-after-death",
+                                             "8 burial-before-death", "27 marriage-after-death",
+                                             "27 marriage-before-birth"}))
+      << describe(report);
+  ASSERT_EQ(report.findings.size(), 5u);
+  EXPECT_NE(report.findings[1].message.find("(1800, line 6)"), std::string::npos);
+  EXPECT_NE(report.findings[4].message.find("wife @I2@ is born (1900, line 17)"), std::string::npos);
+}
+
+// Thousands of pointers read before their record: those resolved stay
+// silent, the rest are reported at the end in the order they were read.
+TEST(KXGCheckerTest, ForwardPointersAreResolvedOrReportedInOrder) {
+  std::string body = "0 @I0@ INDI\n1 FAMC @I1@\n1 FAMS @X@\n0 @I1@ INDI\n";
+  constexpr int kCount = 10000;
+  for (int i = 0; i < kCount; ++i) body += "0 @P" + std::to_string(i) + "@ INDI\n1 FAMS @F" + std::to_string(i) + "@\n";
+  for (int i = 0; i < kCount; ++i) body += "0 @F" + std::to_string(i) + "@ FAM\n1 HUSB @P" + std::to_string(i) + "@\n";
+  body += "0 @N1@ NOTE\n1 SOUR @S9@\n";
+  const KXGReport report = KXGChecker::reportForBytes(bytesOf(gedcom(body)));
+  std::vector<std::string> found;
+  for (const KXGFinding& f : report.findings) found.push_back(std::to_string(f.line) + " " + f.code + " " + f.value);
+  const std::string lastLine = std::to_string(3 + 4 + 4 * kCount + 1);
+  EXPECT_EQ(found, (std::vector<std::string>{"4 pointer-wrong-type @I1@", "5 pointer-missing @X@",
+                                             lastLine + " pointer-missing @S9@"}))
+      << describe(report);
+}
+
 TEST(KXGCheckerTest, EveryCodeIsDocumentedOnceWithASeverityName) {
   std::vector<std::string_view> seen;
   for (const KXGCheckCodeInfo& info : KXGCheckCodes()) {
