@@ -14,8 +14,11 @@
 
 namespace {
 
+// ctest runs the tests of this file in parallel processes: each test gets
+// files of its own, so one test's clean-up cannot pull a file from another.
 std::string writeTemp(const std::string& name, const std::string& contents) {
-  const std::string path = testing::TempDir() + name;
+  const std::string test = testing::UnitTest::GetInstance()->current_test_info()->name();
+  const std::string path = testing::TempDir() + test + "-" + name;
   std::ofstream(path, std::ios::binary) << contents;
   return path;
 }
