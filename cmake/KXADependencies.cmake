@@ -17,3 +17,11 @@ set_property(TARGET PkgConfig::MINIZIP PROPERTY INTERFACE_INCLUDE_DIRECTORIES ""
 pkg_check_modules(LIBZIP REQUIRED IMPORTED_TARGET GLOBAL libzip)
 pkg_check_modules(CAIRO REQUIRED IMPORTED_TARGET GLOBAL cairo)
 pkg_check_modules(VIPS REQUIRED IMPORTED_TARGET GLOBAL vips-cpp)
+# Standalone Asio is header-only and ships no CMake or pkg-config file.
+find_path(ASIO_INCLUDE_DIR asio.hpp REQUIRED)
+if(NOT TARGET kxa_asio)
+  add_library(kxa_asio INTERFACE IMPORTED)
+  target_include_directories(kxa_asio INTERFACE ${ASIO_INCLUDE_DIR})
+  target_compile_definitions(kxa_asio INTERFACE ASIO_STANDALONE ASIO_NO_DEPRECATED)
+  target_link_libraries(kxa_asio INTERFACE Threads::Threads)
+endif()
