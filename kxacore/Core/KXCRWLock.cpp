@@ -27,6 +27,32 @@ void KXCRWLock::ConditionLock::unlockWithCondition(std::int64_t condition) {
   if (anyoneWaiting) changed_.notify_all();
 }
 
+bool KXCRWLock::Semaphore::tryAcquire() noexcept {
+  std::int64_t count = count_.load();
+  while (count > 0) {
+    if (count_.compare_exchange_weak(count, count - 1)) return true;
+  }
+  return false;
+}
+
+void KXCRWLock::Semaphore::acquire() {
+  if (tryAcquire()) return;
+  std::unique_lock held(mutex_);
+  // Counted before the retry, so that a release either sees us waiting
+  // or leaves a count our retry finds (both sides sequentially consistent).
+  ++waiters_;
+  available_.wait(held, [this] { return tryAcquire(); });
+  --waiters_;
+}
+
+void KXCRWLock::Semaphore::release() {
+  ++count_;
+  if (waiters_.load() == 0) return;
+  // Taking the mutex waits for a waiter between its retry and its sleep.
+  { const std::scoped_lock held(mutex_); }
+  available_.notify_one();
+}
+
 void KXCRWLock::startRead() {
   _readersLock.lock();
   _readersCounterLock.lock();

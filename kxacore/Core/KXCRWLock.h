@@ -35,11 +35,11 @@
 // Thread safety: every operation may be called from any thread.
 #pragma once
 
+#include <atomic>
 #include <condition_variable>
 #include <cstdint>
 #include <memory>
 #include <mutex>
-#include <semaphore>
 #include <type_traits>
 #include <utility>
 
@@ -99,6 +99,25 @@ class KXCRWLock {
     std::int64_t waiters_ = 0;    // guarded by mutex_; spares a notify when 0
   };
 
+  // A counting semaphore that stays in user space unless someone waits.
+  // std::counting_semaphore in libstdc++ 12 makes a futex call on every
+  // release from zero, which here is every last reader out and every
+  // writer: a hundred times the cost of the rest of a lock cycle.
+  class Semaphore {
+   public:
+    explicit Semaphore(std::int64_t count) noexcept : count_(count) {}
+    void acquire();
+    void release();
+
+   private:
+    bool tryAcquire() noexcept;
+
+    std::atomic<std::int64_t> count_;
+    std::atomic<std::int64_t> waiters_{0};  // written under mutex_
+    std::mutex mutex_;                     // only for sleeping and waking
+    std::condition_variable available_;
+  };
+
   // Calls the member on scope exit: cheaper on the hot path than a KXCDefer.
   struct Finally {
     KXCRWLock* lock;
@@ -120,7 +139,7 @@ class KXCRWLock {
   // Admits readers; a writer holds it for the whole write.
   std::mutex _readersLock;
   // Held by the readers as a group (first in takes, last out gives) or by one writer.
-  std::counting_semaphore<> _writersSemaphore{1};
+  Semaphore _writersSemaphore{1};
   // Readers inside; guarded by _readersCounterLock.
   std::uint64_t _readersCounter = 0;
   // Readers inside waiting to upgrade; guarded by _readersCounterLock.

@@ -159,7 +159,7 @@ TEST(KXCRWLockConcurrent, UpgradeWaitsForPlainReaderToLeave) {
   });
   std::thread upgrader([&] {
     lock.startRead();
-    inside.count_down();
+    inside.arrive_and_wait();
     lock.readerPerfromWriteOperation([&] { upgraded = readerLeft.load(); });
     lock.stopRead();
   });
