@@ -2,12 +2,10 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <memory>
 #include <regex>
 #include <string>
 #include <type_traits>
-#include <vector>
 
 namespace {
 
@@ -64,16 +62,6 @@ TEST(KXCDictionaryWithIntKeys, CopyIsReadOnlyAndIndependent) {
   EXPECT_EQ(*copied.objectForIntegerKey(1), "a");
   EXPECT_EQ(copied.count(), 2U);
   EXPECT_TRUE(copied.copy().isReadOnly());
-}
-
-TEST(KXCDictionaryWithIntKeys, AllValuesHoldsEachValueOnce) {
-  Strings dictionary;
-  dictionary.setObject(text("x"), 10);
-  dictionary.setObject(text("y"), 20);
-  std::vector<std::string> values;
-  for (const auto& value : dictionary.allValues()) values.push_back(*value);
-  std::sort(values.begin(), values.end());
-  EXPECT_EQ(values, (std::vector<std::string>{"x", "y"}));
 }
 
 TEST(KXCDictionaryWithIntKeys, DescriptionListsKeysAscending) {

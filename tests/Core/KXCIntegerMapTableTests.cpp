@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cstdint>
 #include <limits>
 #include <type_traits>
@@ -35,19 +34,5 @@ TEST_P(KXCIntegerMapTableKeys, StoresReplacesAndTellsZeroFromAbsent) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Keys, KXCIntegerMapTableKeys, testing::Values(0, 1, -1, kMin, kMax));
-
-TEST(KXCIntegerMapTable, ListsEveryKeyOnce) {
-  KXCIntegerMapTable table;
-  std::vector<std::int64_t> expected;
-  for (std::int64_t key = -5000; key < 5000; key += 3) {
-    table.setValue(key * 2, key);
-    expected.push_back(key);
-  }
-  auto keys = table.allKeysAsNumbers();
-  std::sort(keys.begin(), keys.end());
-  EXPECT_EQ(keys, expected);
-  for (const std::int64_t key : expected) ASSERT_EQ(table.valueForKey(key), key * 2) << key;
-  EXPECT_EQ(table.mapTable().size(), expected.size());
-}
 
 }  // namespace

@@ -178,11 +178,6 @@ TEST(KXCSparseObjectArray, IdentityTypesHashByObject) {
   EXPECT_FALSE(a.isEqual(b));
 }
 
-TEST(KXCSparseObjectArray, NewSafeIsSafed) {
-  EXPECT_TRUE(Strings::newSafe()->safed());
-  EXPECT_FALSE(Strings().safed());
-}
-
 // Four threads on one safed array: each owns a band of indexes and checks
 // it, while all of them read, list, copy and compare the whole.
 TEST(KXCSparseObjectArrayConcurrent, SafedArrayFromFourThreads) {
