@@ -5,7 +5,9 @@
 //   lock.doRead([&] { use(table); });
 //   lock.doWrite([&] { table.add(row); });
 //   lock.doRead([&] {
-//     if (!table.has(key)) lock.readerPerfromWriteOperation([&] { table.add(key); });
+//     if (table.has(key)) return;
+//     // Another upgrade may have added it meanwhile: look again inside.
+//     lock.readerPerfromWriteOperation([&] { if (!table.has(key)) table.add(key); });
 //   });
 //
 // How it works: the first reader in takes the writers' semaphore for all
@@ -21,7 +23,8 @@
 // or leaves and no writer runs. Upgrades run one at a time, last caller
 // first: the others resume as readers inside leave. Two readers that both
 // upgrade and then stopRead therefore both get their write. A reader that
-// upgrades and never leaves holds back every upgrade that asked before it.
+// goes on reading after its upgrade holds back every upgrade that asked
+// before it until it leaves.
 //
 // Rules the lock does not check (breaking them deadlocks or corrupts it):
 // - stopRead only after startRead, stopWrite only after startWrite, by the
@@ -40,7 +43,6 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
-#include <type_traits>
 #include <utility>
 
 class KXCRWLock {
