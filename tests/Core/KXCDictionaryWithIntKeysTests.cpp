@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 
 #include <memory>
-#include <regex>
 #include <string>
 #include <type_traits>
 
@@ -74,7 +73,8 @@ TEST(KXCDictionaryWithIntKeys, DescriptionListsKeysAscending) {
 
   KXCDictionaryWithIntKeys<Opaque> opaque;
   opaque.setObject(std::make_shared<Opaque>(), 3);
-  EXPECT_TRUE(std::regex_match(opaque.description(), std::regex(R"(\{3: <0x[0-9a-f]+>\})"))) << opaque.description();
+  const std::string described = opaque.description();
+  EXPECT_TRUE(described.starts_with("{3: <0x") && described.ends_with(">}")) << described;
 }
 
 }  // namespace
