@@ -27,11 +27,13 @@ namespace fs = std::filesystem;
 // What a presenter heard, in order: "change", "move:<file name>", "delete".
 class RecordingPresenter : public KXAFilePresenter {
 public:
-    RecordingPresenter(fs::path url, std::shared_ptr<KXATestQueue> queue)
-        : url_(std::move(url)), queue_(std::move(queue)) {}
+    // The queue is held weakly: a callback left queued at the end of a test
+    // holds its presenter, which must not hold the queue in turn.
+    RecordingPresenter(fs::path url, const std::shared_ptr<KXATestQueue>& queue)
+        : url_(std::move(url)), queue_(queue) {}
 
     fs::path presentedItemURL() const override { return url_; }
-    std::shared_ptr<KXADispatchQueue> presentedItemOperationQueue() const override { return queue_; }
+    std::shared_ptr<KXADispatchQueue> presentedItemOperationQueue() const override { return queue_.lock(); }
 
     void presentedItemDidChange() override { record("change"); }
     void presentedItemDidMoveToURL(const fs::path& newURL) override {
@@ -50,13 +52,14 @@ public:
 
 private:
     void record(std::string event) {
-        EXPECT_TRUE(queue_->isCurrent()) << "callback off its queue: " << event;
+        const auto queue = queue_.lock();
+        EXPECT_TRUE(queue && queue->isCurrent()) << "callback off its queue: " << event;
         std::lock_guard lock(mutex_);
         events_.push_back(std::move(event));
     }
 
     fs::path url_;
-    std::shared_ptr<KXATestQueue> queue_;
+    std::weak_ptr<KXATestQueue> queue_;
     mutable std::mutex mutex_;
     std::vector<std::string> events_;
 };
