@@ -17,8 +17,11 @@
 class KXADispatchQueue;
 
 /// Implemented by objects that want to hear about one file. Callbacks run
-/// on presentedItemOperationQueue(), never while the coordinator's own
-/// locks are held.
+/// on presentedItemOperationQueue() (on the watcher's own thread when that
+/// is null), never while the coordinator's own locks are held. A content
+/// change is reported when its writer closes the file, once per write
+/// however many chunks it wrote; a file kept open and written is reported
+/// at its close.
 class KXAFilePresenter {
 public:
     virtual ~KXAFilePresenter() = default;

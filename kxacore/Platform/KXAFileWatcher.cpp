@@ -343,7 +343,10 @@ struct KXAFileWatcher::State {
             lock.unlock();
             for (const Delivery& delivery : deliveries) {
                 if (delivery.queue) {
-                    delivery.queue->async([delivery] { deliver(delivery); });
+                    // The block must not own its queue, or a queue dropped
+                    // with blocks still in it would keep itself alive.
+                    Delivery queued{delivery.presenter, nullptr, delivery.kind, delivery.newURL};
+                    delivery.queue->async([queued = std::move(queued)] { deliver(queued); });
                 } else {
                     deliver(delivery);
                 }

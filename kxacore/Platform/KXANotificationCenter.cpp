@@ -17,7 +17,6 @@ struct Observation {
   KXANotificationCenter::Token token = 0;
   std::string name;
   KXANotificationCenter::Observer observer;
-  std::shared_ptr<KXADispatchQueue> queue;
   // Guarded by State::mutex.
   bool removed = false;
   std::vector<std::thread::id> callingThreads;  // one entry per call running now
@@ -27,7 +26,13 @@ struct Observation {
 struct State {
   std::mutex mutex;
   std::condition_variable callFinished;
-  std::vector<std::shared_ptr<Observation>> observations;  // in the order added
+  // In the order added. The queue stays out of Observation: queued blocks
+  // hold the observation, and must not hold their own queue.
+  struct Entry {
+    std::shared_ptr<Observation> observation;
+    std::shared_ptr<KXADispatchQueue> queue;
+  };
+  std::vector<Entry> observations;
   KXANotificationCenter::Token lastToken = 0;
 
   static void deliver(const std::shared_ptr<State>& state, const std::shared_ptr<Observation>& observation,
@@ -77,11 +82,10 @@ KXANotificationCenter::Token KXANotificationCenter::addObserver(std::string name
   auto observation = std::make_shared<Observation>();
   observation->name = std::move(name);
   observation->observer = std::move(observer);
-  observation->queue = std::move(queue);
   State& state = *impl_->state;
   std::lock_guard lock(state.mutex);
   observation->token = ++state.lastToken;
-  state.observations.push_back(observation);
+  state.observations.push_back({observation, std::move(queue)});
   return observation->token;
 }
 
@@ -90,9 +94,9 @@ void KXANotificationCenter::removeObserver(Token token) {
   std::unique_lock lock(state.mutex);
   auto& observations = state.observations;
   const auto found = std::find_if(observations.begin(), observations.end(),
-                                  [token](const auto& observation) { return observation->token == token; });
+                                  [token](const State::Entry& entry) { return entry.observation->token == token; });
   if (found == observations.end()) return;
-  const std::shared_ptr<Observation> observation = *found;
+  const std::shared_ptr<Observation> observation = found->observation;
   observations.erase(found);
   observation->removed = true;
   // Calls on this thread are the caller's own stack (an observer removing
@@ -106,19 +110,19 @@ void KXANotificationCenter::removeObserver(Token token) {
 
 void KXANotificationCenter::post(std::string_view name, std::any object) {
   const std::shared_ptr<State>& state = impl_->state;
-  std::vector<std::shared_ptr<Observation>> matching;
+  std::vector<State::Entry> matching;
   {
     std::lock_guard lock(state->mutex);
-    for (const auto& observation : state->observations) {
-      if (observation->name.empty() || observation->name == name) matching.push_back(observation);
+    for (const auto& entry : state->observations) {
+      if (entry.observation->name.empty() || entry.observation->name == name) matching.push_back(entry);
     }
   }
   if (matching.empty()) return;
   auto notification = std::make_shared<const KXANotification>(KXANotification{std::string(name), std::move(object)});
-  for (const auto& observation : matching) {
-    if (observation->queue) {
+  for (const auto& [observation, queue] : matching) {
+    if (queue) {
       // The block owns the state: a private centre may go while it waits.
-      observation->queue->async([state, observation, notification] {
+      queue->async([state, observation = observation, notification] {
         State::deliver(state, observation, *notification);
       });
     } else {

@@ -5,11 +5,14 @@
 
 #include <algorithm>
 #include <atomic>
+#include <chrono>
+#include <condition_variable>
 #include <filesystem>
 #include <fstream>
 #include <functional>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <thread>
 #include <vector>
@@ -24,11 +27,13 @@ namespace fs = std::filesystem;
 // What a presenter heard, in order: "change", "move:<file name>", "delete".
 class RecordingPresenter : public KXAFilePresenter {
 public:
-    RecordingPresenter(fs::path url, std::shared_ptr<KXATestQueue> queue)
-        : url_(std::move(url)), queue_(std::move(queue)) {}
+    // The queue is held weakly: a callback left queued at the end of a test
+    // holds its presenter, which must not hold the queue in turn.
+    RecordingPresenter(fs::path url, const std::shared_ptr<KXATestQueue>& queue)
+        : url_(std::move(url)), queue_(queue) {}
 
     fs::path presentedItemURL() const override { return url_; }
-    std::shared_ptr<KXADispatchQueue> presentedItemOperationQueue() const override { return queue_; }
+    std::shared_ptr<KXADispatchQueue> presentedItemOperationQueue() const override { return queue_.lock(); }
 
     void presentedItemDidChange() override { record("change"); }
     void presentedItemDidMoveToURL(const fs::path& newURL) override {
@@ -47,13 +52,14 @@ public:
 
 private:
     void record(std::string event) {
-        EXPECT_TRUE(queue_->isCurrent()) << "callback off its queue: " << event;
+        const auto queue = queue_.lock();
+        EXPECT_TRUE(queue && queue->isCurrent()) << "callback off its queue: " << event;
         std::lock_guard lock(mutex_);
         events_.push_back(std::move(event));
     }
 
     fs::path url_;
-    std::shared_ptr<KXATestQueue> queue_;
+    std::weak_ptr<KXATestQueue> queue_;
     mutable std::mutex mutex_;
     std::vector<std::string> events_;
 };
@@ -235,6 +241,38 @@ TEST_F(KXAFilePresenterThreads, RemovedAndDestroyedPresentersHearNothing) {
     ASSERT_TRUE(waitForEvents(*listening, 2));
     settle();
     EXPECT_EQ(listening->events().size(), 2u);
+}
+
+TEST_F(KXAFilePresenterThreads, CallbacksRunOnASerialQueue) {
+    class SerialPresenter : public KXAFilePresenter {
+    public:
+        SerialPresenter(fs::path url) : url_(std::move(url)) {}
+        fs::path presentedItemURL() const override { return url_; }
+        std::shared_ptr<KXADispatchQueue> presentedItemOperationQueue() const override { return queue_; }
+        void presentedItemDidChange() override {
+            std::lock_guard lock(mutex_);
+            onQueue_ = queue_->isCurrent();
+            changed_.notify_all();
+        }
+        std::optional<bool> waitForChange() {
+            std::unique_lock lock(mutex_);
+            changed_.wait_for(lock, std::chrono::seconds(10), [&] { return onQueue_.has_value(); });
+            return onQueue_;
+        }
+
+    private:
+        fs::path url_;
+        std::shared_ptr<KXADispatchQueue> queue_ = KXADispatchQueue::serialQueue("KXAFilePresenterThreads");
+        std::mutex mutex_;
+        std::condition_variable changed_;
+        std::optional<bool> onQueue_;
+    };
+    writeFile(folder_ / "story", "original");
+    auto presenter = std::make_shared<SerialPresenter>(folder_ / "story");
+    KXAFileCoordinator::addFilePresenter(presenter);
+    ASSERT_TRUE(KXAWriteFileAtomically(folder_ / "story", "replaced"));
+    EXPECT_EQ(presenter->waitForChange(), std::optional<bool>(true));
+    KXAFileCoordinator::removeFilePresenter(presenter.get());
 }
 
 TEST_F(KXAFilePresenterThreads, AMissingFolderIsAcceptedQuietly) {

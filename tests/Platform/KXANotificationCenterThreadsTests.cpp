@@ -139,6 +139,22 @@ TEST(KXANotificationCenterThreads, QueuedDeliveryOutlivesAPrivateCentre) {
     EXPECT_EQ(calls, 1);
 }
 
+TEST(KXANotificationCenterThreads, QueuedDeliveryOnASerialQueueKeepsOrder) {
+    KXANotificationCenter center;
+    auto queue = KXADispatchQueue::serialQueue("KXANotificationCenterThreads");
+    std::vector<int> seen;  // touched only on the queue
+    bool offQueue = false;
+    center.addObserver("N", [&](const KXANotification& notification) {
+        offQueue = offQueue || !queue->isCurrent();
+        seen.push_back(std::any_cast<int>(notification.object));
+    }, queue);
+    for (int post = 0; post < 100; ++post) center.post("N", post);
+    queue->sync([] {});  // the queue is serial: everything posted before has run
+    ASSERT_EQ(seen.size(), 100u);
+    for (int post = 0; post < 100; ++post) EXPECT_EQ(seen[post], post);
+    EXPECT_FALSE(offQueue);
+}
+
 TEST(KXANotificationCenterThreads, DefaultCenterIsOneObject) {
     EXPECT_EQ(&KXANotificationCenter::defaultCenter(), &KXANotificationCenter::defaultCenter());
 }
