@@ -23,6 +23,12 @@ bool turnMainUntil(const std::function<bool()>& condition) {
   return KXARunLoop::main().runUntil(condition, kHangGuard);
 }
 
+struct Call {
+  std::thread::id thread;
+  bool onMainLoop = false;
+  std::any context;
+};
+
 // Records where and with what each call came; `work` runs inside doWork.
 class RecordingDelegate : public KXCBackgroundWorkerDelegate {
  public:
@@ -32,44 +38,33 @@ class RecordingDelegate : public KXCBackgroundWorkerDelegate {
   std::atomic<int> didFinishCalls = 0;
 
   void workerDoWorkWithContextInfo(KXCBackgroundWorker& worker, const std::any& context) override {
-    {
-      std::scoped_lock lock(mutex_);
-      workThread_ = std::this_thread::get_id();
-      workContext_ = context;
-    }
+    record(lastWork_, context);
     if (work) work(worker);
     ++doWorkCalls;
   }
   void workerDidFinishWithContextInfo(KXCBackgroundWorker& worker, const std::any& context) override {
-    {
-      std::scoped_lock lock(mutex_);
-      finishThread_ = std::this_thread::get_id();
-      finishOnMainLoop_ = KXARunLoop::isMainThread();
-      finishContext_ = context;
-    }
+    record(lastFinish_, context);
     if (finish) finish(worker);
     ++didFinishCalls;
   }
-
-  std::thread::id workThread() const { return locked(workThread_); }
-  std::thread::id finishThread() const { return locked(finishThread_); }
-  bool finishOnMainLoop() const { return locked(finishOnMainLoop_); }
-  std::any workContext() const { return locked(workContext_); }
-  std::any finishContext() const { return locked(finishContext_); }
-
- private:
-  template <typename T>
-  T locked(const T& value) const {
+  Call lastWork() const {
     std::scoped_lock lock(mutex_);
-    return value;
+    return lastWork_;
+  }
+  Call lastFinish() const {
+    std::scoped_lock lock(mutex_);
+    return lastFinish_;
   }
 
-  mutable std::mutex mutex_;
-  std::thread::id workThread_;
-  std::thread::id finishThread_;
-  bool finishOnMainLoop_ = false;
-  std::any workContext_;
-  std::any finishContext_;
+ private:
+  void record(Call& call, const std::any& context) {
+    std::scoped_lock lock(mutex_);
+    call = Call{std::this_thread::get_id(), KXARunLoop::isMainThread(), context};
+  }
+
+  mutable std::mutex mutex_;  // guards the two calls
+  Call lastWork_;
+  Call lastFinish_;
 };
 
 // Work that runs until the worker is cancelled.
@@ -90,11 +85,12 @@ TEST_F(KXCBackgroundWorkerThreads, WorkRunsOnItsThreadAndCompletionOnTheMainLoop
   worker->startWithContextInfo(std::string("batch 7"));
   ASSERT_TRUE(turnMainUntil([&] { return delegate->didFinishCalls == 1; }));
   EXPECT_EQ(delegate->doWorkCalls, 1);
-  EXPECT_NE(delegate->workThread(), std::this_thread::get_id());
-  EXPECT_EQ(delegate->finishThread(), std::this_thread::get_id());
-  EXPECT_TRUE(delegate->finishOnMainLoop());
-  EXPECT_EQ(std::any_cast<std::string>(delegate->workContext()), "batch 7");
-  EXPECT_EQ(std::any_cast<std::string>(delegate->finishContext()), "batch 7");
+  EXPECT_NE(delegate->lastWork().thread, std::this_thread::get_id());
+  EXPECT_FALSE(delegate->lastWork().onMainLoop);
+  EXPECT_EQ(delegate->lastFinish().thread, std::this_thread::get_id());
+  EXPECT_TRUE(delegate->lastFinish().onMainLoop);
+  EXPECT_EQ(std::any_cast<std::string>(delegate->lastWork().context), "batch 7");
+  EXPECT_EQ(std::any_cast<std::string>(delegate->lastFinish().context), "batch 7");
   EXPECT_FALSE(worker->isExecuting());
   EXPECT_FALSE(worker->isCancelled());
 }
@@ -173,7 +169,7 @@ TEST_F(KXCBackgroundWorkerThreads, CompletionMayStartTheNextRun) {
   worker->startWithContextInfo(1);
   ASSERT_TRUE(turnMainUntil([&] { return delegate->didFinishCalls == 2; }));
   EXPECT_EQ(delegate->doWorkCalls, 2);
-  EXPECT_EQ(std::any_cast<int>(delegate->finishContext()), 2);
+  EXPECT_EQ(std::any_cast<int>(delegate->lastFinish().context), 2);
 }
 
 TEST_F(KXCBackgroundWorkerThreads, StartWhileExecutingOrUnsharedDoesNothing) {
@@ -219,20 +215,6 @@ TEST_F(KXCBackgroundWorkerThreads, WorkersCancelledMidRunFromManyThreads) {
   EXPECT_EQ(delegate->doWorkCalls, kWorkers);
 }
 
-TEST_F(KXCBackgroundWorkerThreads, BaseWorkerOnlyKeepsState) {
-  auto delegate = std::make_shared<RecordingDelegate>();
-  KXCBackgroundWorker worker(delegate);
-  EXPECT_EQ(worker.delegate(), delegate);
-  worker.startWithContextInfo(5);
-  EXPECT_EQ(std::any_cast<int>(worker.context()), 5);
-  EXPECT_FALSE(worker.isExecuting());
-  worker.cancelWithRunloop();
-  EXPECT_TRUE(worker.isCancelled());
-  EXPECT_EQ(delegate->doWorkCalls, 0);
-  delegate.reset();
-  EXPECT_EQ(worker.delegate(), nullptr) << "held weakly";
-}
-
 TEST_F(KXCBackgroundWorkerThreads, NullWorkerRunsBothCallsAtOnceAndOnlyOnce) {
   auto delegate = std::make_shared<RecordingDelegate>();
   auto worker = std::make_shared<KXCNullBackgroundWorker>(delegate);
@@ -246,22 +228,20 @@ TEST_F(KXCBackgroundWorkerThreads, NullWorkerRunsBothCallsAtOnceAndOnlyOnce) {
   EXPECT_EQ(delegate->didFinishCalls, 1);
   EXPECT_TRUE(executingInside);
   EXPECT_FALSE(worker->isExecuting());
-  EXPECT_EQ(delegate->workThread(), std::this_thread::get_id());
-  EXPECT_EQ(delegate->finishThread(), std::this_thread::get_id());
-  EXPECT_EQ(std::any_cast<std::string>(delegate->workContext()), "outer");
+  EXPECT_EQ(delegate->lastWork().thread, std::this_thread::get_id());
+  EXPECT_EQ(delegate->lastFinish().thread, std::this_thread::get_id());
+  EXPECT_EQ(std::any_cast<std::string>(delegate->lastWork().context), "outer");
   // The inner start still stored its context, as every start does.
-  EXPECT_EQ(std::any_cast<std::string>(delegate->finishContext()), "inner");
+  EXPECT_EQ(std::any_cast<std::string>(delegate->lastFinish().context), "inner");
 
   delegate->work = nullptr;
   worker->startWithContextInfo(std::string("again"));
   EXPECT_EQ(delegate->doWorkCalls, 2);
-}
 
-TEST_F(KXCBackgroundWorkerThreads, NullWorkerWithoutDelegateOnlyStoresTheContext) {
-  auto worker = std::make_shared<KXCNullBackgroundWorker>();
+  delegate.reset();  // held weakly: now there is none, and start only stores
   worker->startWithContextInfo(9);
   EXPECT_EQ(std::any_cast<int>(worker->context()), 9);
-  EXPECT_FALSE(worker->isExecuting());
+  EXPECT_EQ(worker->delegate(), nullptr);
 }
 
 }  // namespace
