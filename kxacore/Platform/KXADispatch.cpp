@@ -55,6 +55,15 @@ class CurrentQueueScope {
   const KXADispatchQueue* previous_;
 };
 
+// Runs the block as `queue`'s and destroys it right after, on this thread.
+void runAsCurrent(const KXADispatchQueue* queue, KXADispatchBlock& block) {
+  {
+    CurrentQueueScope scope(queue);
+    runBlock(block);
+  }
+  block = nullptr;
+}
+
 // One-shot signal for sync(): shared with the queued block so that neither
 // side outlives what it touches.
 class Completion {
@@ -227,14 +236,7 @@ class SerialQueue final : public KXADispatchQueue, public std::enable_shared_fro
     SyncWaiter* waiter;  // set for a thread waiting in sync() instead of block
   };
 
-  // The block is destroyed here, on the queue's thread, after it ran.
-  void runHere(KXADispatchBlock& block) {
-    {
-      CurrentQueueScope scope(this);
-      runBlock(block);
-    }
-    block = nullptr;
-  }
+  void runHere(KXADispatchBlock& block) { runAsCurrent(this, block); }
 
   void postDrain() {
     asio::post(sharedPool(), [self = shared_from_this()] { self->drain(); });
@@ -320,13 +322,7 @@ class GlobalQueue final : public KXADispatchQueue, public std::enable_shared_fro
   bool isCurrent() const override { return tCurrentQueue == this; }
 
  private:
-  void runHere(KXADispatchBlock& block) {
-    {
-      CurrentQueueScope scope(this);
-      runBlock(block);
-    }
-    block = nullptr;
-  }
+  void runHere(KXADispatchBlock& block) { runAsCurrent(this, block); }
 
   const std::string label_;
 };

@@ -356,19 +356,6 @@ TEST_F(KXADispatchThreads, TwoThreadsTurningTheMainLoopTakeTurnsInOrder) {
   for (int i = 0; i < kBlocks; ++i) ASSERT_EQ(order[i], i);
 }
 
-TEST_F(KXADispatchThreads, EachThreadTurnsItsOwnLoop) {
-  std::atomic<std::size_t> ranThere = 0;
-  std::atomic<bool> mainThere = true;
-  std::thread other([&] {
-    auto& own = KXARunLoop::current();
-    own.perform([&] { mainThere = KXARunLoop::isMainThread(); });
-    ranThere = own.runUntilIdle();
-  });
-  other.join();
-  EXPECT_EQ(ranThere, 1u);
-  EXPECT_FALSE(mainThere);
-}
-
 TEST_F(KXADispatchThreads, TimerCoalescesMissedEventsIntoOne) {
   auto source = KXADispatchTimerSource::timerOnQueue(KXADispatchQueue::mainQueue());
   int fires = 0;
