@@ -300,7 +300,8 @@ int main(int argc, char** argv) {
               kHeight);
 #endif
   for (const std::size_t radius : {1, 5, 20}) {
-    const std::string suffix = "/" + std::to_string(radius);
+    std::string suffix = "/";  // appended, not "/" + ...: GCC 12 warns falsely (-Wrestrict)
+    suffix += std::to_string(radius);
     for (const std::size_t channels : {1, 4}) {
       const std::string c = std::to_string(channels);
       const std::vector<std::uint8_t>& image = channels == 1 ? grey() : colour();
