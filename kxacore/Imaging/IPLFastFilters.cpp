@@ -353,6 +353,36 @@ void scatterRows(const Plane& plane, const RowStrip& strip, const std::uint8_t* 
   }
 }
 
+// Rows of packed samples under small windows need no transposing: the
+// extreme of 2r + 1 neighbours is 2r vector operations on shifted loads of a
+// zero-padded copy of the row (copied first, so in place is safe).
+constexpr std::size_t kDirectRowRadius = 8;
+
+template <bool isMinimum>
+void directRows(const Plane& plane, std::size_t radius) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const std::size_t channels = plane.channels;
+  const std::size_t bytes = plane.width * channels, pad = radius * channels;
+  const std::size_t chunks = (bytes + n - 1) / n * n;
+  Buffer padded, line;
+  padded.resize(chunks + 2 * pad);
+  line.resize(chunks);
+  for (std::size_t y = 0; y < plane.height; ++y) {
+    std::memcpy(padded.data() + pad, plane.source + y * plane.sourceRowBytes, bytes);
+    for (std::size_t x = 0; x < bytes; x += n) {
+      auto extreme = hn::LoadU(d, padded.data() + x);
+      for (std::size_t k = 1; k <= 2 * radius; ++k) {
+        const auto next = hn::LoadU(d, padded.data() + x + k * channels);
+        if constexpr (isMinimum) extreme = hn::Min(extreme, next);
+        else extreme = hn::Max(extreme, next);
+      }
+      hn::StoreU(extreme, d, line.data() + x);
+    }
+    std::memcpy(plane.destination + y * plane.destinationRowBytes, line.data(), bytes);
+  }
+}
+
 template <Kind kind>
 void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
   const std::size_t width = plane.width, height = plane.height, channels = plane.channels;
@@ -362,9 +392,12 @@ void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
 
   // Rows, kStrip / channels rows at once. Every source row of the strip is
   // read before any destination row is written, so in place is safe.
-  scratch.reserve(width + 2 * radius, morphology);
   const std::size_t rowsPerStrip = kStrip / channels;
-  for (std::size_t first = 0; first < height; first += rowsPerStrip) {
+  const bool packedRows = plane.sourceStep == channels && plane.destinationStep == channels;
+  const bool rowsDirect = morphology && packedRows && radius <= kDirectRowRadius;
+  if (rowsDirect) directRows<kind == Kind::erode>(plane, radius);
+  else scratch.reserve(width + 2 * radius, morphology);
+  for (std::size_t first = 0; !rowsDirect && first < height; first += rowsPerStrip) {
     const RowStrip strip{first, std::min(rowsPerStrip, height - first), channels};
     gatherRows(plane, strip, scratch.block.data() + radius * kStrip);
     filterBlock<kind>(scratch, width, radius, table);
