@@ -383,6 +383,55 @@ void directRows(const Plane& plane, std::size_t radius) {
   }
 }
 
+// Columns of packed rows under small windows: whole rows at a time, the
+// extreme of rows y - r ... y + r, streaming through memory with no strip
+// copies. Rows above y are already overwritten, so their originals are kept
+// in a ring of r + 1 rows; rows outside the image are zero.
+template <bool isMinimum>
+void directColumns(const Plane& plane, std::size_t radius) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const std::size_t bytes = plane.width * plane.channels, height = plane.height;
+  const std::size_t full = bytes / n * n;
+  Buffer ring, line;
+  ring.resize((radius + 1) * bytes);
+  line.resize(bytes);
+  const std::uint8_t* rows[2 * kDirectRowRadius + 1];
+  const auto destinationRow = [&](std::size_t y) { return plane.destination + y * plane.destinationRowBytes; };
+  for (std::size_t y = 0; y < height; ++y) {
+    std::memcpy(ring.data() + y % (radius + 1) * bytes, destinationRow(y), bytes);
+    std::size_t count = 0;
+    bool outside = false;
+    for (std::size_t k = 0; k <= 2 * radius; ++k) {
+      if (y + k < radius || y + k - radius >= height) {
+        outside = true;
+        continue;
+      }
+      const std::size_t source = y + k - radius;
+      rows[count++] = source <= y ? ring.data() + source % (radius + 1) * bytes : destinationRow(source);
+    }
+    if (isMinimum && outside) {
+      std::memset(line.data(), 0, bytes);
+    } else {
+      for (std::size_t x = 0; x < full; x += n) {
+        auto extreme = hn::LoadU(d, rows[0] + x);
+        for (std::size_t i = 1; i < count; ++i) {
+          if constexpr (isMinimum) extreme = hn::Min(extreme, hn::LoadU(d, rows[i] + x));
+          else extreme = hn::Max(extreme, hn::LoadU(d, rows[i] + x));
+        }
+        hn::StoreU(extreme, d, line.data() + x);
+      }
+      for (std::size_t x = full; x < bytes; ++x) {
+        std::uint8_t extreme = rows[0][x];
+        for (std::size_t i = 1; i < count; ++i)
+          extreme = isMinimum ? std::min(extreme, rows[i][x]) : std::max(extreme, rows[i][x]);
+        line.data()[x] = extreme;
+      }
+    }
+    std::memcpy(destinationRow(y), line.data(), bytes);
+  }
+}
+
 template <Kind kind>
 void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
   const std::size_t width = plane.width, height = plane.height, channels = plane.channels;
@@ -402,6 +451,11 @@ void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
     gatherRows(plane, strip, scratch.block.data() + radius * kStrip);
     filterBlock<kind>(scratch, width, radius, table);
     scatterRows(plane, strip, scratch.out.data());
+  }
+
+  if (morphology && plane.destinationStep == channels && radius <= kDirectRowRadius) {
+    directColumns<kind == Kind::erode>(plane, radius);
+    return;
   }
 
   // Columns of the destination in place, kStrip neighbouring bytes at once.
