@@ -1,5 +1,6 @@
 // Fast forms of the blur family: O(1) work per sample whatever the radius
-// (except the repeated 3-tap blur, radius passes by definition). Rows and
+// (except the repeated 3-tap blur, radius passes by definition, and erosion
+// and dilation under radius 9, where the direct extreme is cheaper). Rows and
 // columns are processed as strips of 64 lanes laid side by side (64 lines of
 // one channel, or 16 lines of 4-byte pixels), so the inner loops run over
 // independent lanes as SIMD vectors, compiled for several instruction sets
