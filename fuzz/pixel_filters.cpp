@@ -5,6 +5,7 @@
 // Properties checked (abort on failure):
 //   - every public filter writes exactly the bytes the plain form writes,
 //     separate or in place, and leaves the bytes between samples alone;
+//   - the whole-pixel forms equal four one-channel plain runs with step 4;
 //   - no operation reads or writes outside the described buffers (ASan).
 #include <fuzzer/FuzzedDataProvider.h>
 
@@ -47,6 +48,32 @@ void compareFilter(FuzzedDataProvider& input) {
   check(expected == actual);
 }
 
+using PixelFilter = void (*)(const uint8_t*, uint8_t*, size_t, size_t, size_t, size_t, size_t);
+
+void compareWholePixels(FuzzedDataProvider& input) {
+  const auto filter = static_cast<Filter>(input.ConsumeIntegralInRange<int>(0, 3));
+  const std::size_t width = input.ConsumeIntegralInRange<std::size_t>(1, 40);
+  const std::size_t height = input.ConsumeIntegralInRange<std::size_t>(1, 40);
+  const std::size_t rowBytes = width * 4 + input.ConsumeIntegralInRange<std::size_t>(0, 5);
+  const std::size_t radius =
+      input.ConsumeIntegralInRange<std::size_t>(0, filter == Filter::gaussian ? 20 : 50);
+  const bool inPlace = input.ConsumeBool();
+  std::vector<std::uint8_t> source(rowBytes * height);
+  for (auto& byte : source) byte = input.ConsumeIntegral<std::uint8_t>();
+  std::vector<std::uint8_t> expected = source, actual = source;
+  for (std::size_t channel = 0; channel < 4; ++channel) {
+    const std::uint8_t* from = (inPlace ? expected.data() : source.data()) + channel;
+    kxa::ipl::referenceFilter(filter, from, expected.data() + channel, width, height, 4, 4, rowBytes,
+                              rowBytes, radius);
+  }
+  const PixelFilter call = filter == Filter::box        ? IPLBoxBlur32BitAlphaFirstImage
+                           : filter == Filter::gaussian ? IPLGaussianBlur32BitAlphaFirstImage
+                           : filter == Filter::erode    ? IPLErode32BitAlphaFirstImage
+                                                        : IPLDilate32BitAlphaFirstImage;
+  call(inPlace ? actual.data() : source.data(), actual.data(), width, height, rowBytes, rowBytes, radius);
+  check(expected == actual);
+}
+
 void runPixelOperations(FuzzedDataProvider& input) {
   const std::size_t side = input.ConsumeIntegralInRange<std::size_t>(0, 24);
   const std::size_t rowBytes = side * 4 + input.ConsumeIntegralInRange<std::size_t>(0, 8);
@@ -78,10 +105,10 @@ void runPixelOperations(FuzzedDataProvider& input) {
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   FuzzedDataProvider input(data, size);
-  if (input.ConsumeBool()) {
-    compareFilter(input);
-  } else {
-    runPixelOperations(input);
+  switch (input.ConsumeIntegralInRange<int>(0, 2)) {
+    case 0: compareFilter(input); break;
+    case 1: compareWholePixels(input); break;
+    default: runPixelOperations(input); break;
   }
   return 0;
 }

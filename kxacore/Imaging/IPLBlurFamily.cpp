@@ -36,7 +36,7 @@ void IPLBoxBlur(const uint8_t* source, uint8_t* destination, size_t width, size_
                 size_t destinationRowBytes, size_t radius) {
   if (width == 0 || height == 0 || !blurRadiusAccepted(radius)) return;
   box(Plane{source, destination, width, height, sourceStep, destinationStep, sourceRowBytes,
-            destinationRowBytes},
+            destinationRowBytes, 1},
       radius);
 }
 
@@ -45,7 +45,7 @@ void IPLGaussianBlur(const uint8_t* source, uint8_t* destination, size_t width, 
                      size_t destinationRowBytes, size_t radius) {
   if (width == 0 || height == 0 || !blurRadiusAccepted(radius)) return;
   gaussian(Plane{source, destination, width, height, sourceStep, destinationStep, sourceRowBytes,
-                 destinationRowBytes},
+                 destinationRowBytes, 1},
            radius);
 }
 
@@ -54,7 +54,7 @@ void IPLErode(const uint8_t* source, uint8_t* destination, size_t width, size_t 
               size_t destinationRowBytes, size_t radius) {
   if (width == 0 || height == 0) return;
   const Plane plane{source, destination, width, height, sourceStep, destinationStep,
-                    sourceRowBytes, destinationRowBytes};
+                    sourceRowBytes, destinationRowBytes, 1};
   kxa::ipl::fastErode(plane, effectiveMorphologyRadius(plane, radius));
 }
 
@@ -63,7 +63,7 @@ void IPLDilate(const uint8_t* source, uint8_t* destination, size_t width, size_t
                size_t destinationRowBytes, size_t radius) {
   if (width == 0 || height == 0) return;
   const Plane plane{source, destination, width, height, sourceStep, destinationStep,
-                    sourceRowBytes, destinationRowBytes};
+                    sourceRowBytes, destinationRowBytes, 1};
   kxa::ipl::fastDilate(plane, effectiveMorphologyRadius(plane, radius));
 }
 
@@ -74,7 +74,7 @@ void IPLBlur(const uint8_t* source, uint8_t* destination, size_t width, size_t h
   const bool blurs = blur == IPLBlurBox || blur == IPLBlurGaussian;
   if (blurs && !blurRadiusAccepted(radius)) return;
   Plane plane{source, destination, width, height, sourceStep, destinationStep, sourceRowBytes,
-              destinationRowBytes};
+              destinationRowBytes, 1};
   if (morphology == IPLMorphologyErode || morphology == IPLMorphologyDilate) {
     const std::size_t morphologyRadius = effectiveMorphologyRadius(plane, radius);
     if (morphology == IPLMorphologyErode) kxa::ipl::fastErode(plane, morphologyRadius);
@@ -86,6 +86,40 @@ void IPLBlur(const uint8_t* source, uint8_t* destination, size_t width, size_t h
   }
   if (blur == IPLBlurBox) box(plane, radius);
   else if (blur == IPLBlurGaussian) gaussian(plane, radius);
+}
+
+// Whole 32-bit pixels: the four bytes are four channels filtered together.
+
+void IPLBoxBlur32BitAlphaFirstImage(const uint8_t* source, uint8_t* destination, size_t width,
+                                    size_t height, size_t sourceRowBytes,
+                                    size_t destinationRowBytes, size_t radius) {
+  if (width == 0 || height == 0 || !blurRadiusAccepted(radius)) return;
+  box(Plane{source, destination, width, height, 4, 4, sourceRowBytes, destinationRowBytes, 4},
+      radius);
+}
+
+void IPLGaussianBlur32BitAlphaFirstImage(const uint8_t* source, uint8_t* destination,
+                                         size_t width, size_t height, size_t sourceRowBytes,
+                                         size_t destinationRowBytes, size_t radius) {
+  if (width == 0 || height == 0 || !blurRadiusAccepted(radius)) return;
+  gaussian(Plane{source, destination, width, height, 4, 4, sourceRowBytes, destinationRowBytes, 4},
+           radius);
+}
+
+void IPLErode32BitAlphaFirstImage(const uint8_t* source, uint8_t* destination, size_t width,
+                                  size_t height, size_t sourceRowBytes,
+                                  size_t destinationRowBytes, size_t radius) {
+  if (width == 0 || height == 0) return;
+  const Plane plane{source, destination, width, height, 4, 4, sourceRowBytes, destinationRowBytes, 4};
+  kxa::ipl::fastErode(plane, effectiveMorphologyRadius(plane, radius));
+}
+
+void IPLDilate32BitAlphaFirstImage(const uint8_t* source, uint8_t* destination, size_t width,
+                                   size_t height, size_t sourceRowBytes,
+                                   size_t destinationRowBytes, size_t radius) {
+  if (width == 0 || height == 0) return;
+  const Plane plane{source, destination, width, height, 4, 4, sourceRowBytes, destinationRowBytes, 4};
+  kxa::ipl::fastDilate(plane, effectiveMorphologyRadius(plane, radius));
 }
 
 }  // extern "C"

@@ -2,208 +2,491 @@
 // morphology uses the van Herk / Gil-Werman split into blocks of one window
 // length with prefix and suffix extremes, so a window's extreme is one
 // comparison of a suffix and a prefix, with no rescans on flat regions.
-// Columns are handled kStrip at a time: a strip is gathered into a small
-// padded block whose rows are contiguous, so the inner loops run over
-// neighbouring columns and vectorise.
+//
+// Both passes work on a padded block of kStrip lanes per position: the
+// column pass copies kStrip neighbouring bytes of each row (contiguous), the
+// row pass transposes kStrip / channels rows into it (16 x 16 byte or 4 x 4
+// pixel SIMD transposes), so every filter loop runs down the block over whole
+// vectors. This file is compiled once per instruction set (Highway's
+// foreach_target) and the best one the CPU has is chosen at the first call.
+
+#undef HWY_TARGET_INCLUDE
+#define HWY_TARGET_INCLUDE "kxacore/Imaging/IPLFastFilters.cpp"
+#include <hwy/foreach_target.h>  // re-includes this file per target
+#include <hwy/aligned_allocator.h>
+#include <hwy/highway.h>
 
 #include "kxacore/Imaging/IPLFastFilters.h"
 
 #include <algorithm>
+#include <cstring>
 #include <vector>
 
+HWY_BEFORE_NAMESPACE();
 namespace kxa::ipl {
+namespace HWY_NAMESPACE {
 namespace {
+
+namespace hn = hwy::HWY_NAMESPACE;
 
 constexpr std::size_t kStrip = 64;
 
-// Mirrors `lanes`-wide rows around rows radius ... radius + count - 1 of a
-// padded block, with the edge row repeated; left and right interleaved so
-// that radii past the line keep reflecting (the plain form does the same).
-void mirrorRows(std::uint8_t* block, std::size_t count, std::size_t radius, std::size_t lanes) {
+enum class Kind { box, gaussian, erode, dilate };
+
+// Mirrors rows around rows radius ... radius + count - 1 of a padded block,
+// with the edge row repeated; left and right interleaved so that radii past
+// the line keep reflecting (the plain form does the same).
+void mirrorRows(std::uint8_t* block, std::size_t count, std::size_t radius) {
   for (std::size_t j = 0; j < radius; ++j) {
-    std::copy_n(block + (radius + j) * lanes, lanes, block + (radius - 1 - j) * lanes);
-    std::copy_n(block + (radius + count - 1 - j) * lanes, lanes, block + (radius + count + j) * lanes);
+    std::memcpy(block + (radius - 1 - j) * kStrip, block + (radius + j) * kStrip, kStrip);
+    std::memcpy(block + (radius + count + j) * kStrip, block + (radius + count - 1 - j) * kStrip,
+                kStrip);
   }
 }
 
-void zeroRows(std::uint8_t* block, std::size_t count, std::size_t radius, std::size_t lanes) {
-  std::fill_n(block, radius * lanes, std::uint8_t{0});
-  std::fill_n(block + (radius + count) * lanes, radius * lanes, std::uint8_t{0});
+void zeroRows(std::uint8_t* block, std::size_t count, std::size_t radius) {
+  std::memset(block, 0, radius * kStrip);
+  std::memset(block + (radius + count) * kStrip, 0, radius * kStrip);
 }
 
-// Running sums down a padded block of `lanes` columns; writes count rows.
-template <std::size_t lanes, typename Sum>
+// Running sums down a padded block; writes count rows. Sums are 32-bit
+// lanes; the rounded division is a multiply and shift while RoundedDivider
+// is exact, a table look-up beyond.
 void boxRunning(const std::uint8_t* block, std::size_t count, std::size_t radius,
                 const std::uint8_t* table, std::uint8_t* out) {
-  Sum sums[lanes] = {};
+  const hn::ScalableTag<std::uint32_t> d32;
+  const hn::Rebind<std::int32_t, decltype(d32)> di32;
+  const hn::Rebind<std::uint8_t, decltype(d32)> d8;
+  const std::size_t n = hn::Lanes(d32);
+  HWY_ALIGN std::uint32_t sums[kStrip] = {};
+  const auto load = [&](const std::uint8_t* bytes) {
+    return hn::BitCast(d32, hn::PromoteTo(di32, hn::LoadU(d8, bytes)));
+  };
   for (std::size_t i = 0; i <= 2 * radius; ++i) {
-    const std::uint8_t* row = block + i * lanes;
-    for (std::size_t l = 0; l < lanes; ++l) sums[l] = static_cast<Sum>(sums[l] + row[l]);
+    for (std::size_t l = 0; l < kStrip; l += n)
+      hn::StoreU(hn::Add(hn::LoadU(d32, sums + l), load(block + i * kStrip + l)), d32, sums + l);
   }
   const bool multiply = radius <= RoundedDivider::kMaximumRadius;
   const RoundedDivider divide(multiply ? radius : 0);
+  const auto rounding = hn::Set(d32, divide.radius);
+  const auto multiplier = hn::Set(d32, divide.multiplier);
   for (std::size_t y = 0; y < count; ++y) {
-    std::uint8_t* target = out + y * lanes;
-    if (multiply) {
-      for (std::size_t l = 0; l < lanes; ++l) target[l] = divide(sums[l]);
-    } else {
-      for (std::size_t l = 0; l < lanes; ++l) target[l] = table[sums[l]];
+    std::uint8_t* target = out + y * kStrip;
+    const std::uint8_t* entering = block + (y + 2 * radius + 1) * kStrip;
+    const std::uint8_t* leaving = block + y * kStrip;
+    const bool last = y + 1 == count;
+    for (std::size_t l = 0; l < kStrip; l += n) {
+      auto sum = hn::LoadU(d32, sums + l);
+      if (multiply) {
+        const auto quotient = hn::ShiftRight<RoundedDivider::kShift>(hn::Mul(hn::Add(sum, rounding), multiplier));
+        hn::StoreU(hn::DemoteTo(d8, hn::BitCast(di32, quotient)), d8, target + l);
+      } else {
+        for (std::size_t k = 0; k < n; ++k) target[l + k] = table[sums[l + k]];
+      }
+      if (!last) {
+        sum = hn::Sub(hn::Add(sum, load(entering + l)), load(leaving + l));
+        hn::StoreU(sum, d32, sums + l);
+      }
     }
-    if (y + 1 == count) break;
-    const std::uint8_t* entering = block + (y + 2 * radius + 1) * lanes;
-    const std::uint8_t* leaving = block + y * lanes;
-    for (std::size_t l = 0; l < lanes; ++l)
-      sums[l] = static_cast<Sum>(sums[l] + entering[l] - leaving[l]);
   }
-}
-
-template <bool isMinimum>
-inline std::uint8_t pick(std::uint8_t a, std::uint8_t b) {
-  return isMinimum ? std::min(a, b) : std::max(a, b);
 }
 
 // van Herk / Gil-Werman over a padded block of `length` rows: out row y is
 // the extreme of rows y ... y + 2r.
-template <bool isMinimum, std::size_t lanes>
+template <bool isMinimum>
 void vanHerk(const std::uint8_t* block, std::size_t length, std::size_t radius,
              std::uint8_t* prefix, std::uint8_t* suffix, std::uint8_t* out, std::size_t count) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const auto pick = [](auto a, auto b) {
+    if constexpr (isMinimum) return hn::Min(a, b);
+    else return hn::Max(a, b);
+  };
   const std::size_t window = 2 * radius + 1;
   for (std::size_t start = 0; start < length; start += window) {
     const std::size_t end = std::min(start + window, length);
-    std::copy_n(block + start * lanes, lanes, prefix + start * lanes);
+    std::memcpy(prefix + start * kStrip, block + start * kStrip, kStrip);
     for (std::size_t i = start + 1; i < end; ++i) {
-      const std::uint8_t* row = block + i * lanes;
-      const std::uint8_t* before = prefix + (i - 1) * lanes;
-      std::uint8_t* target = prefix + i * lanes;
-      for (std::size_t l = 0; l < lanes; ++l) target[l] = pick<isMinimum>(before[l], row[l]);
+      for (std::size_t l = 0; l < kStrip; l += n) {
+        const auto before = hn::LoadU(d, prefix + (i - 1) * kStrip + l);
+        hn::StoreU(pick(before, hn::LoadU(d, block + i * kStrip + l)), d, prefix + i * kStrip + l);
+      }
     }
-    std::copy_n(block + (end - 1) * lanes, lanes, suffix + (end - 1) * lanes);
+    std::memcpy(suffix + (end - 1) * kStrip, block + (end - 1) * kStrip, kStrip);
     for (std::size_t i = end - 1; i-- > start;) {
-      const std::uint8_t* row = block + i * lanes;
-      const std::uint8_t* after = suffix + (i + 1) * lanes;
-      std::uint8_t* target = suffix + i * lanes;
-      for (std::size_t l = 0; l < lanes; ++l) target[l] = pick<isMinimum>(after[l], row[l]);
+      for (std::size_t l = 0; l < kStrip; l += n) {
+        const auto after = hn::LoadU(d, suffix + (i + 1) * kStrip + l);
+        hn::StoreU(pick(after, hn::LoadU(d, block + i * kStrip + l)), d, suffix + i * kStrip + l);
+      }
     }
   }
   for (std::size_t y = 0; y < count; ++y) {
-    const std::uint8_t* left = suffix + y * lanes;
-    const std::uint8_t* right = prefix + (y + 2 * radius) * lanes;
-    std::uint8_t* target = out + y * lanes;
-    for (std::size_t l = 0; l < lanes; ++l) target[l] = pick<isMinimum>(left[l], right[l]);
+    for (std::size_t l = 0; l < kStrip; l += n) {
+      const auto left = hn::LoadU(d, suffix + y * kStrip + l);
+      const auto right = hn::LoadU(d, prefix + (y + 2 * radius) * kStrip + l);
+      hn::StoreU(pick(left, right), d, out + y * kStrip + l);
+    }
+  }
+}
+
+// Small windows: the extreme of 2r + 1 rows directly, cheaper than the
+// prefix and suffix passes of van Herk up to about five rows.
+constexpr std::size_t kDirectMorphologyRadius = 2;
+
+template <bool isMinimum>
+void directExtreme(const std::uint8_t* block, std::size_t radius, std::uint8_t* out, std::size_t count) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  for (std::size_t y = 0; y < count; ++y) {
+    for (std::size_t l = 0; l < kStrip; l += n) {
+      auto extreme = hn::LoadU(d, block + y * kStrip + l);
+      for (std::size_t k = 1; k <= 2 * radius; ++k) {
+        const auto row = hn::LoadU(d, block + (y + k) * kStrip + l);
+        if constexpr (isMinimum) extreme = hn::Min(extreme, row);
+        else extreme = hn::Max(extreme, row);
+      }
+      hn::StoreU(extreme, d, out + y * kStrip + l);
+    }
   }
 }
 
 // `passes` rounds of the rounded 3-tap mean over a padded block; the first
 // and last rows stay as they are (their influence never reaches the output
-// rows, which sit `passes` rows inside the padding).
-template <std::size_t lanes>
+// rows, which sit `passes` rows inside the padding). One sweep per pass: a
+// wavefront of passes kept in L1 measured slower (the block already sits in
+// L2 and the sweep is compute-bound). round(s / 3) for s <= 765 is the high
+// half of (s + 1) * 21846, exact over that range.
 void repeatedThreeTap(std::uint8_t* block, std::size_t length, std::size_t passes,
                       std::uint8_t* out, std::size_t count) {
-  const RoundedDivider third(1);
-  std::uint8_t previous[lanes];
+  const hn::ScalableTag<std::int16_t> d16;
+  const hn::Rebind<std::uint8_t, decltype(d16)> d8;
+  const std::size_t n = hn::Lanes(d16);
+  const auto one = hn::Set(d16, 1);
+  const auto third = hn::Set(d16, 21846);
+  HWY_ALIGN std::uint8_t previous[kStrip];
   for (std::size_t pass = 0; pass < passes; ++pass) {
-    std::copy_n(block, lanes, previous);
+    std::memcpy(previous, block, kStrip);
     for (std::size_t i = 1; i + 1 < length; ++i) {
-      std::uint8_t* row = block + i * lanes;
-      const std::uint8_t* next = row + lanes;
-      for (std::size_t l = 0; l < lanes; ++l) {
-        const std::uint8_t current = row[l];
-        row[l] = third(static_cast<std::uint32_t>(previous[l]) + current + next[l]);
-        previous[l] = current;
+      std::uint8_t* row = block + i * kStrip;
+      for (std::size_t l = 0; l < kStrip; l += n) {
+        const auto before = hn::LoadU(d8, previous + l);
+        const auto current = hn::LoadU(d8, row + l);
+        const auto next = hn::LoadU(d8, row + kStrip + l);
+        const auto sum = hn::Add(hn::Add(hn::PromoteTo(d16, before), hn::PromoteTo(d16, current)),
+                                 hn::Add(hn::PromoteTo(d16, next), one));
+        hn::StoreU(current, d8, previous + l);
+        hn::StoreU(hn::DemoteTo(d8, hn::MulHigh(sum, third)), d8, row + l);
       }
     }
   }
-  std::copy_n(block + passes * lanes, count * lanes, out);
+  std::memcpy(out, block + passes * kStrip, count * kStrip);
 }
 
-enum class Kind { box, gaussian, erode, dilate };
+// 16 rows of 16 bytes to 16 rows of 16 bytes, transposed: four rounds of
+// interleaving pairs, after which vector k holds column bitreverse(k).
+void transposeBytes16(const std::uint8_t* in, std::size_t inStride, std::uint8_t* out,
+                      std::size_t outStride) {
+#if HWY_TARGET == HWY_SCALAR
+  for (std::size_t r = 0; r < 16; ++r)
+    for (std::size_t c = 0; c < 16; ++c) out[c * outStride + r] = in[r * inStride + c];
+#else
+  const hn::Full128<std::uint8_t> d8;
+  const hn::Full128<std::uint16_t> d16;
+  const hn::Full128<std::uint32_t> d32;
+  const hn::Full128<std::uint64_t> d64;
+  using V = hn::Vec<decltype(d8)>;
+  V v[16], w[16];
+  for (std::size_t r = 0; r < 16; ++r) v[r] = hn::LoadU(d8, in + r * inStride);
+  for (std::size_t i = 0; i < 8; ++i) {
+    w[i] = hn::InterleaveLower(d8, v[2 * i], v[2 * i + 1]);
+    w[i + 8] = hn::InterleaveUpper(d8, v[2 * i], v[2 * i + 1]);
+  }
+  for (std::size_t i = 0; i < 8; ++i) {
+    const auto a = hn::BitCast(d16, w[2 * i]), b = hn::BitCast(d16, w[2 * i + 1]);
+    v[i] = hn::BitCast(d8, hn::InterleaveLower(d16, a, b));
+    v[i + 8] = hn::BitCast(d8, hn::InterleaveUpper(d16, a, b));
+  }
+  for (std::size_t i = 0; i < 8; ++i) {
+    const auto a = hn::BitCast(d32, v[2 * i]), b = hn::BitCast(d32, v[2 * i + 1]);
+    w[i] = hn::BitCast(d8, hn::InterleaveLower(d32, a, b));
+    w[i + 8] = hn::BitCast(d8, hn::InterleaveUpper(d32, a, b));
+  }
+  constexpr std::size_t kColumnOf[16] = {0, 8, 4, 12, 2, 10, 6, 14, 1, 9, 5, 13, 3, 11, 7, 15};
+  for (std::size_t i = 0; i < 8; ++i) {
+    const auto a = hn::BitCast(d64, w[2 * i]), b = hn::BitCast(d64, w[2 * i + 1]);
+    hn::StoreU(hn::BitCast(d8, hn::InterleaveLower(d64, a, b)), d8, out + kColumnOf[i] * outStride);
+    hn::StoreU(hn::BitCast(d8, hn::InterleaveUpper(d64, a, b)), d8, out + kColumnOf[i + 8] * outStride);
+  }
+#endif
+}
+
+// 4 rows of 4 pixels (4 bytes each) to 4 rows of 4 pixels, transposed.
+void transposePixels4(const std::uint8_t* in, std::size_t inStride, std::uint8_t* out,
+                      std::size_t outStride) {
+#if HWY_TARGET == HWY_SCALAR
+  for (std::size_t r = 0; r < 4; ++r)
+    for (std::size_t c = 0; c < 4; ++c) std::memcpy(out + c * outStride + r * 4, in + r * inStride + c * 4, 4);
+#else
+  const hn::Full128<std::uint32_t> d32;
+  const hn::Full128<std::uint64_t> d64;
+  const auto a = hn::LoadU(d32, reinterpret_cast<const std::uint32_t*>(in));
+  const auto b = hn::LoadU(d32, reinterpret_cast<const std::uint32_t*>(in + inStride));
+  const auto c = hn::LoadU(d32, reinterpret_cast<const std::uint32_t*>(in + 2 * inStride));
+  const auto d = hn::LoadU(d32, reinterpret_cast<const std::uint32_t*>(in + 3 * inStride));
+  const auto ab0 = hn::BitCast(d64, hn::InterleaveLower(d32, a, b));
+  const auto ab1 = hn::BitCast(d64, hn::InterleaveUpper(d32, a, b));
+  const auto cd0 = hn::BitCast(d64, hn::InterleaveLower(d32, c, d));
+  const auto cd1 = hn::BitCast(d64, hn::InterleaveUpper(d32, c, d));
+  const auto store = [&](auto vector, std::size_t row) {
+    hn::StoreU(hn::BitCast(d32, vector), d32, reinterpret_cast<std::uint32_t*>(out + row * outStride));
+  };
+  store(hn::InterleaveLower(d64, ab0, cd0), 0);
+  store(hn::InterleaveUpper(d64, ab0, cd0), 1);
+  store(hn::InterleaveLower(d64, ab1, cd1), 2);
+  store(hn::InterleaveUpper(d64, ab1, cd1), 3);
+#endif
+}
+
+// Cache-line aligned working rows (unaligned loads are used all the same).
+struct Buffer {
+  hwy::AlignedFreeUniquePtr<std::uint8_t[]> bytes;
+  std::size_t size = 0;
+  void resize(std::size_t wanted) {
+    if (wanted <= size) return;
+    bytes = hwy::AllocateAligned<std::uint8_t>(wanted);
+    std::memset(bytes.get(), 0, wanted);
+    size = wanted;
+  }
+  std::uint8_t* data() { return bytes.get(); }
+};
 
 struct Scratch {
-  std::vector<std::uint8_t> block, prefix, suffix, out;
-  void reserve(std::size_t paddedLength, std::size_t lanes, bool morphology) {
-    block.resize(paddedLength * lanes);
-    out.resize(paddedLength * lanes);
+  Buffer block, prefix, suffix, out;
+  void reserve(std::size_t paddedLength, bool morphology) {
+    block.resize(paddedLength * kStrip);
+    out.resize(paddedLength * kStrip);
     if (morphology) {
-      prefix.resize(paddedLength * lanes);
-      suffix.resize(paddedLength * lanes);
+      prefix.resize(paddedLength * kStrip);
+      suffix.resize(paddedLength * kStrip);
     }
   }
 };
 
-template <Kind kind, std::size_t lanes>
+template <Kind kind>
 void filterBlock(Scratch& scratch, std::size_t count, std::size_t radius,
                  const std::uint8_t* table) {
   std::uint8_t* block = scratch.block.data();
   if constexpr (kind == Kind::gaussian) {
-    mirrorRows(block, count, radius, lanes);
-    repeatedThreeTap<lanes>(block, count + 2 * radius, radius, scratch.out.data(), count);
+    mirrorRows(block, count, radius);
+    repeatedThreeTap(block, count + 2 * radius, radius, scratch.out.data(), count);
   } else if constexpr (kind == Kind::box) {
-    mirrorRows(block, count, radius, lanes);
-    // 16-bit sums suffice up to a window of 257 samples.
-    if (2 * radius + 1 <= 257) {
-      boxRunning<lanes, std::uint16_t>(block, count, radius, table, scratch.out.data());
-    } else {
-      boxRunning<lanes, std::uint32_t>(block, count, radius, table, scratch.out.data());
-    }
+    mirrorRows(block, count, radius);
+    boxRunning(block, count, radius, table, scratch.out.data());
   } else {
-    zeroRows(block, count, radius, lanes);
-    vanHerk<kind == Kind::erode, lanes>(block, count + 2 * radius, radius, scratch.prefix.data(),
-                                        scratch.suffix.data(), scratch.out.data(), count);
+    zeroRows(block, count, radius);
+    if (radius <= kDirectMorphologyRadius) {
+      directExtreme<kind == Kind::erode>(block, radius, scratch.out.data(), count);
+    } else {
+      vanHerk<kind == Kind::erode>(block, count + 2 * radius, radius, scratch.prefix.data(),
+                                   scratch.suffix.data(), scratch.out.data(), count);
+    }
+  }
+}
+
+// Which rows of a strip, and how their pixels map to lanes.
+struct RowStrip {
+  std::size_t first, used, channels;
+};
+
+// Gathers the strip's rows into the block (position x, lane row * channels +
+// channel). Whole groups of rows go through the SIMD transposes when the
+// pixels are packed; the rest byte by byte. Unused lanes are zero.
+void gatherRows(const Plane& plane, const RowStrip& strip, std::uint8_t* block) {
+  const std::size_t channels = strip.channels, width = plane.width;
+  const bool packed = plane.sourceStep == channels;
+  const std::size_t groupRows = channels == 1 ? 16 : 4, groupColumns = groupRows;
+  const std::size_t fullGroups = packed ? strip.used / groupRows : 0;
+  const std::size_t simdColumns = width / groupColumns * groupColumns;
+  for (std::size_t group = 0; group < fullGroups; ++group) {
+    const std::uint8_t* in = plane.source + (strip.first + group * groupRows) * plane.sourceRowBytes;
+    std::uint8_t* lanes = block + group * 16;
+    for (std::size_t x = 0; x < simdColumns; x += groupColumns) {
+      if (channels == 1) transposeBytes16(in + x, plane.sourceRowBytes, lanes + x * kStrip, kStrip);
+      else transposePixels4(in + x * 4, plane.sourceRowBytes, lanes + x * kStrip, kStrip);
+    }
+  }
+  const std::size_t rowsPerStrip = kStrip / channels;
+  for (std::size_t row = 0; row < rowsPerStrip; ++row) {
+    const bool simd = row < fullGroups * groupRows;
+    const std::size_t from = simd ? simdColumns : 0;
+    std::uint8_t* lanes = block + row * channels;
+    if (row >= strip.used) {
+      for (std::size_t x = 0; x < width; ++x) std::memset(lanes + x * kStrip, 0, channels);
+      continue;
+    }
+    const std::uint8_t* in = plane.source + (strip.first + row) * plane.sourceRowBytes;
+    for (std::size_t x = from; x < width; ++x)
+      for (std::size_t c = 0; c < channels; ++c) lanes[x * kStrip + c] = in[x * plane.sourceStep + c];
+  }
+}
+
+void scatterRows(const Plane& plane, const RowStrip& strip, const std::uint8_t* block) {
+  const std::size_t channels = strip.channels, width = plane.width;
+  const bool packed = plane.destinationStep == channels;
+  const std::size_t groupRows = channels == 1 ? 16 : 4, groupColumns = groupRows;
+  const std::size_t fullGroups = packed ? strip.used / groupRows : 0;
+  const std::size_t simdColumns = width / groupColumns * groupColumns;
+  for (std::size_t group = 0; group < fullGroups; ++group) {
+    std::uint8_t* out = plane.destination + (strip.first + group * groupRows) * plane.destinationRowBytes;
+    const std::uint8_t* lanes = block + group * 16;
+    for (std::size_t x = 0; x < simdColumns; x += groupColumns) {
+      if (channels == 1) transposeBytes16(lanes + x * kStrip, kStrip, out + x, plane.destinationRowBytes);
+      else transposePixels4(lanes + x * kStrip, kStrip, out + x * 4, plane.destinationRowBytes);
+    }
+  }
+  for (std::size_t row = 0; row < strip.used; ++row) {
+    const std::size_t from = row < fullGroups * groupRows ? simdColumns : 0;
+    std::uint8_t* out = plane.destination + (strip.first + row) * plane.destinationRowBytes;
+    const std::uint8_t* lanes = block + row * channels;
+    for (std::size_t x = from; x < width; ++x)
+      for (std::size_t c = 0; c < channels; ++c) out[x * plane.destinationStep + c] = lanes[x * kStrip + c];
+  }
+}
+
+// Rows of packed samples under small windows need no transposing: the
+// extreme of 2r + 1 neighbours is 2r vector operations on shifted loads of a
+// zero-padded copy of the row (copied first, so in place is safe).
+constexpr std::size_t kDirectRowRadius = 8;
+
+template <bool isMinimum>
+void directRows(const Plane& plane, std::size_t radius) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const std::size_t channels = plane.channels;
+  const std::size_t bytes = plane.width * channels, pad = radius * channels;
+  const std::size_t chunks = (bytes + n - 1) / n * n;
+  Buffer padded, line;
+  padded.resize(chunks + 2 * pad);
+  line.resize(chunks);
+  for (std::size_t y = 0; y < plane.height; ++y) {
+    std::memcpy(padded.data() + pad, plane.source + y * plane.sourceRowBytes, bytes);
+    for (std::size_t x = 0; x < bytes; x += n) {
+      auto extreme = hn::LoadU(d, padded.data() + x);
+      for (std::size_t k = 1; k <= 2 * radius; ++k) {
+        const auto next = hn::LoadU(d, padded.data() + x + k * channels);
+        if constexpr (isMinimum) extreme = hn::Min(extreme, next);
+        else extreme = hn::Max(extreme, next);
+      }
+      hn::StoreU(extreme, d, line.data() + x);
+    }
+    std::memcpy(plane.destination + y * plane.destinationRowBytes, line.data(), bytes);
+  }
+}
+
+// Columns of packed rows under small windows: whole rows at a time, the
+// extreme of rows y - r ... y + r, streaming through memory with no strip
+// copies. Rows above y are already overwritten, so their originals are kept
+// in a ring of r + 1 rows; rows outside the image are zero.
+template <bool isMinimum>
+void directColumns(const Plane& plane, std::size_t radius) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const std::size_t bytes = plane.width * plane.channels, height = plane.height;
+  const std::size_t full = bytes / n * n;
+  Buffer ring, line;
+  ring.resize((radius + 1) * bytes);
+  line.resize(bytes);
+  const std::uint8_t* rows[2 * kDirectRowRadius + 1];
+  const auto destinationRow = [&](std::size_t y) { return plane.destination + y * plane.destinationRowBytes; };
+  for (std::size_t y = 0; y < height; ++y) {
+    std::memcpy(ring.data() + y % (radius + 1) * bytes, destinationRow(y), bytes);
+    std::size_t count = 0;
+    bool outside = false;
+    for (std::size_t k = 0; k <= 2 * radius; ++k) {
+      if (y + k < radius || y + k - radius >= height) {
+        outside = true;
+        continue;
+      }
+      const std::size_t source = y + k - radius;
+      rows[count++] = source <= y ? ring.data() + source % (radius + 1) * bytes : destinationRow(source);
+    }
+    if (isMinimum && outside) {
+      std::memset(line.data(), 0, bytes);
+    } else {
+      for (std::size_t x = 0; x < full; x += n) {
+        auto extreme = hn::LoadU(d, rows[0] + x);
+        for (std::size_t i = 1; i < count; ++i) {
+          if constexpr (isMinimum) extreme = hn::Min(extreme, hn::LoadU(d, rows[i] + x));
+          else extreme = hn::Max(extreme, hn::LoadU(d, rows[i] + x));
+        }
+        hn::StoreU(extreme, d, line.data() + x);
+      }
+      for (std::size_t x = full; x < bytes; ++x) {
+        std::uint8_t extreme = rows[0][x];
+        for (std::size_t i = 1; i < count; ++i)
+          extreme = isMinimum ? std::min(extreme, rows[i][x]) : std::max(extreme, rows[i][x]);
+        line.data()[x] = extreme;
+      }
+    }
+    std::memcpy(destinationRow(y), line.data(), bytes);
   }
 }
 
 template <Kind kind>
 void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
-  const std::size_t width = plane.width, height = plane.height;
+  const std::size_t width = plane.width, height = plane.height, channels = plane.channels;
   if (width == 0 || height == 0) return;
   constexpr bool morphology = kind == Kind::erode || kind == Kind::dilate;
   Scratch scratch;
 
-  // Rows, kStrip rows at once: the strip is transposed into the block so the
-  // same lane-parallel loops run along the rows. Every source row of the
-  // strip is read before any destination row is written.
-  scratch.reserve(width + 2 * radius, kStrip, morphology);
-  for (std::size_t first = 0; first < height; first += kStrip) {
-    const std::size_t used = std::min(kStrip, height - first);
-    std::uint8_t* block = scratch.block.data() + radius * kStrip;
-    for (std::size_t lane = 0; lane < used; ++lane) {
-      const std::uint8_t* in = plane.source + (first + lane) * plane.sourceRowBytes;
-      for (std::size_t x = 0; x < width; ++x) block[x * kStrip + lane] = in[x * plane.sourceStep];
-    }
-    for (std::size_t lane = used; lane < kStrip; ++lane)
-      for (std::size_t x = 0; x < width; ++x) block[x * kStrip + lane] = 0;
-    filterBlock<kind, kStrip>(scratch, width, radius, table);
-    for (std::size_t lane = 0; lane < used; ++lane) {
-      std::uint8_t* out = plane.destination + (first + lane) * plane.destinationRowBytes;
-      const std::uint8_t* filtered = scratch.out.data() + lane;
-      for (std::size_t x = 0; x < width; ++x) out[x * plane.destinationStep] = filtered[x * kStrip];
-    }
+  // Rows, kStrip / channels rows at once. Every source row of the strip is
+  // read before any destination row is written, so in place is safe.
+  const std::size_t rowsPerStrip = kStrip / channels;
+  const bool packedRows = plane.sourceStep == channels && plane.destinationStep == channels;
+  const bool rowsDirect = morphology && packedRows && radius <= kDirectRowRadius;
+  if (rowsDirect) directRows<kind == Kind::erode>(plane, radius);
+  else scratch.reserve(width + 2 * radius, morphology);
+  for (std::size_t first = 0; !rowsDirect && first < height; first += rowsPerStrip) {
+    const RowStrip strip{first, std::min(rowsPerStrip, height - first), channels};
+    gatherRows(plane, strip, scratch.block.data() + radius * kStrip);
+    filterBlock<kind>(scratch, width, radius, table);
+    scatterRows(plane, strip, scratch.out.data());
   }
 
-  // Columns of the destination in place, kStrip neighbouring columns at once.
-  scratch.reserve(height + 2 * radius, kStrip, morphology);
+  if (morphology && plane.destinationStep == channels && radius <= kDirectRowRadius) {
+    directColumns<kind == Kind::erode>(plane, radius);
+    return;
+  }
+
+  // Columns of the destination in place, kStrip neighbouring bytes at once.
+  // Packed pixels make each row one run of width * channels bytes whose
+  // columns are independent, whatever channel they belong to.
+  scratch.reserve(height + 2 * radius, morphology);
   const std::size_t step = plane.destinationStep;
-  for (std::size_t first = 0; first < width; first += kStrip) {
-    const std::size_t used = std::min(kStrip, width - first);
-    std::uint8_t* base = plane.destination + first * step;
+  const bool packed = step == channels;
+  const std::size_t columns = packed ? width * channels : width;
+  const std::size_t stride = packed ? 1 : step;
+  for (std::size_t first = 0; first < columns; first += kStrip) {
+    const std::size_t used = std::min(kStrip, columns - first);
+    std::uint8_t* base = plane.destination + first * stride;
     for (std::size_t y = 0; y < height; ++y) {
       const std::uint8_t* row = base + y * plane.destinationRowBytes;
       std::uint8_t* lane = scratch.block.data() + (radius + y) * kStrip;
-      if (step == 1) {
-        std::copy_n(row, used, lane);
+      if (stride == 1) {
+        std::memcpy(lane, row, used);
       } else {
-        for (std::size_t l = 0; l < used; ++l) lane[l] = row[l * step];
+        for (std::size_t l = 0; l < used; ++l) lane[l] = row[l * stride];
       }
-      std::fill(lane + used, lane + kStrip, std::uint8_t{0});
+      std::memset(lane + used, 0, kStrip - used);
     }
-    filterBlock<kind, kStrip>(scratch, height, radius, table);
+    filterBlock<kind>(scratch, height, radius, table);
     for (std::size_t y = 0; y < height; ++y) {
       std::uint8_t* row = base + y * plane.destinationRowBytes;
       const std::uint8_t* lane = scratch.out.data() + y * kStrip;
-      if (step == 1) {
-        std::copy_n(lane, used, row);
+      if (stride == 1) {
+        std::memcpy(row, lane, used);
       } else {
-        for (std::size_t l = 0; l < used; ++l) row[l * step] = lane[l];
+        for (std::size_t l = 0; l < used; ++l) row[l * stride] = lane[l];
       }
     }
   }
@@ -211,18 +494,61 @@ void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
 
 }  // namespace
 
+// kind: 0 box, 1 repeated 3-tap, 2 erode, 3 dilate.
+void FilterPlane(int kind, const Plane& plane, std::size_t radius, const std::uint8_t* table) {
+  switch (kind) {
+    case 0: run<Kind::box>(plane, radius, table); break;
+    case 1: run<Kind::gaussian>(plane, radius, table); break;
+    case 2: run<Kind::erode>(plane, radius, table); break;
+    default: run<Kind::dilate>(plane, radius, table); break;
+  }
+}
+
+}  // namespace HWY_NAMESPACE
+}  // namespace kxa::ipl
+HWY_AFTER_NAMESPACE();
+
+#if HWY_ONCE
+#include <hwy/targets.h>
+
+namespace kxa::ipl {
+
+HWY_EXPORT(FilterPlane);
+
 void fastBoxBlur(const Plane& plane, std::size_t radius, const std::uint8_t* divisionTable) {
-  run<Kind::box>(plane, radius, divisionTable);
+  HWY_DYNAMIC_DISPATCH(FilterPlane)(0, plane, radius, divisionTable);
 }
 
 void fastGaussianBlur(const Plane& plane, std::size_t radius) {
-  run<Kind::gaussian>(plane, radius, nullptr);
+  HWY_DYNAMIC_DISPATCH(FilterPlane)(1, plane, radius, nullptr);
 }
 
-void fastErode(const Plane& plane, std::size_t radius) { run<Kind::erode>(plane, radius, nullptr); }
+void fastErode(const Plane& plane, std::size_t radius) {
+  HWY_DYNAMIC_DISPATCH(FilterPlane)(2, plane, radius, nullptr);
+}
 
 void fastDilate(const Plane& plane, std::size_t radius) {
-  run<Kind::dilate>(plane, radius, nullptr);
+  HWY_DYNAMIC_DISPATCH(FilterPlane)(3, plane, radius, nullptr);
+}
+
+namespace {
+std::vector<std::int64_t> compiledTargets() {
+  hwy::SetSupportedTargetsForTest(0);  // back to what the CPU reports
+  return hwy::SupportedAndGeneratedTargets();
+}
+}  // namespace
+
+std::vector<std::string> availableInstructionSets() {
+  std::vector<std::string> names;
+  for (const std::int64_t target : compiledTargets()) names.emplace_back(hwy::TargetName(target));
+  return names;
+}
+
+void forceInstructionSet(int index) {
+  const auto targets = compiledTargets();
+  if (index >= 0 && static_cast<std::size_t>(index) < targets.size())
+    hwy::SetSupportedTargetsForTest(targets[static_cast<std::size_t>(index)]);
 }
 
 }  // namespace kxa::ipl
+#endif  // HWY_ONCE

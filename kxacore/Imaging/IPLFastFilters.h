@@ -1,12 +1,17 @@
 // Fast forms of the blur family: O(1) work per sample whatever the radius
-// (except the repeated 3-tap blur, radius passes by definition). Rows and
-// columns are processed as strips of 64 neighbouring lines laid side by side,
-// so the inner loops run over 64 independent lanes and vectorise. Byte-identical to the plain
-// forms in IPLReference.h (the tests compare them). Internal.
+// (except the repeated 3-tap blur, radius passes by definition, and erosion
+// and dilation under radius 9, where the direct extreme is cheaper). Rows and
+// columns are processed as strips of 64 lanes laid side by side (64 lines of
+// one channel, or 16 lines of 4-byte pixels), so the inner loops run over
+// independent lanes as SIMD vectors, compiled for several instruction sets
+// and chosen at run time (Highway). Byte-identical to the plain forms in
+// IPLReference.h on every instruction set (the tests compare them). Internal.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
+#include <string>
+#include <vector>
 
 namespace kxa::ipl {
 
@@ -16,6 +21,9 @@ struct Plane {
   std::size_t width, height;
   std::size_t sourceStep, destinationStep;
   std::size_t sourceRowBytes, destinationRowBytes;
+  // Adjacent bytes filtered together as separate channels: 1, or 4 for
+  // whole 32-bit pixels (then both steps are 4).
+  std::size_t channels;
 };
 
 // round(sum / (2r + 1)) as a multiply and shift, for windows whose sums
@@ -38,5 +46,13 @@ void fastBoxBlur(const Plane& plane, std::size_t radius, const std::uint8_t* div
 void fastGaussianBlur(const Plane& plane, std::size_t radius);
 void fastErode(const Plane& plane, std::size_t radius);
 void fastDilate(const Plane& plane, std::size_t radius);
+
+// The instruction sets compiled in that this CPU runs, by name, best first;
+// forceInstructionSet(i) makes the filters use the i-th of them until
+// forceInstructionSet(-1) (or listing them again) restores the automatic
+// choice. For tests and benchmarks only: it changes the choice for the whole
+// process, so no filter may run on another thread meanwhile.
+std::vector<std::string> availableInstructionSets();
+void forceInstructionSet(int index);
 
 }  // namespace kxa::ipl

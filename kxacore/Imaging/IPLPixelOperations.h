@@ -94,6 +94,29 @@ void IPLBlur(const uint8_t *source, uint8_t *destination, size_t width,
              size_t sourceRowBytes, size_t destinationRowBytes, size_t radius,
              int morphology, int blur);
 
+/* The four filters above on every byte of 32-bit alpha-first pixels (alpha
+ * included) in one pass over the interleaved image: the same bytes as four
+ * calls of the 8-bit filter with step 4, one per byte of the pixel, at a
+ * fraction of the cost. Row lengths are in bytes (at least 4 x width).
+ * In place. */
+void IPLBoxBlur32BitAlphaFirstImage(const uint8_t *source, uint8_t *destination,
+                                    size_t width, size_t height,
+                                    size_t sourceRowBytes,
+                                    size_t destinationRowBytes, size_t radius);
+void IPLGaussianBlur32BitAlphaFirstImage(const uint8_t *source,
+                                         uint8_t *destination, size_t width,
+                                         size_t height, size_t sourceRowBytes,
+                                         size_t destinationRowBytes,
+                                         size_t radius);
+void IPLErode32BitAlphaFirstImage(const uint8_t *source, uint8_t *destination,
+                                  size_t width, size_t height,
+                                  size_t sourceRowBytes,
+                                  size_t destinationRowBytes, size_t radius);
+void IPLDilate32BitAlphaFirstImage(const uint8_t *source, uint8_t *destination,
+                                   size_t width, size_t height,
+                                   size_t sourceRowBytes,
+                                   size_t destinationRowBytes, size_t radius);
+
 /* Working forms of the blur family: lineBuffer holds at least
  * max(width, height) + 2 * radius + 1 bytes; divisionTable (blurs only) has
  * (2k + 1) * 255 + 1 entries, entry s = (s + k) / (2k + 1), with k the radius

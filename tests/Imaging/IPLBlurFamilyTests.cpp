@@ -82,31 +82,116 @@ void expectSameAsReference(std::mt19937& random, Filter filter, std::size_t widt
 
 class BlurFamilyMatchesReference : public ::testing::TestWithParam<Filter> {};
 
-TEST_P(BlurFamilyMatchesReference, SmallImagesEveryRadiusPastTheImage) {
-  std::mt19937 random(1234 + static_cast<unsigned>(GetParam()));
-  for (std::size_t width = 1; width <= 13; width += 3) {
-    for (std::size_t height = 1; height <= 11; height += 2) {
-      for (std::size_t radius = 0; radius <= std::max(width, height) + 3; ++radius) {
-        expectSameAsReference(random, GetParam(), width, height, radius, radius % 2 == 1);
-        if (HasFatalFailure()) return;
-      }
-    }
+// Runs body once per instruction set the filters were compiled for and this
+// CPU runs, so every SIMD form is held to the reference, not just the best.
+template <typename Body>
+void forEachInstructionSet(Body body) {
+  const auto names = kxa::ipl::availableInstructionSets();
+  ASSERT_FALSE(names.empty());
+  for (std::size_t i = 0; i < names.size(); ++i) {
+    SCOPED_TRACE("instruction set " + names[i]);
+    kxa::ipl::forceInstructionSet(static_cast<int>(i));
+    body();
+    kxa::ipl::forceInstructionSet(-1);
+    if (::testing::Test::HasFatalFailure()) return;
   }
 }
 
+TEST_P(BlurFamilyMatchesReference, SmallImagesEveryRadiusPastTheImage) {
+  forEachInstructionSet([this] {
+    std::mt19937 random(1234 + static_cast<unsigned>(GetParam()));
+    for (std::size_t width = 1; width <= 13; width += 3) {
+      for (std::size_t height = 1; height <= 11; height += 2) {
+        for (std::size_t radius = 0; radius <= std::max(width, height) + 3; ++radius) {
+          expectSameAsReference(random, GetParam(), width, height, radius, radius % 2 == 1);
+          if (HasFatalFailure()) return;
+        }
+      }
+    }
+  });
+}
+
 TEST_P(BlurFamilyMatchesReference, RandomSizesAcrossColumnStrips) {
-  std::mt19937 random(99 + static_cast<unsigned>(GetParam()));
-  std::uniform_int_distribution<std::size_t> side(1, 200);
-  for (int round = 0; round < 60; ++round) {
-    const std::size_t width = side(random), height = side(random);
-    const std::size_t longest = std::max(width, height);
-    const std::size_t radius =
-        round % 5 == 0 ? longest + 1 : std::uniform_int_distribution<std::size_t>(0, 25)(random);
-    // The repeated 3-tap blur runs radius passes: keep it cheap.
-    const std::size_t used = GetParam() == Filter::gaussian ? std::min<std::size_t>(radius, 12) : radius;
-    expectSameAsReference(random, GetParam(), width, height, used, round % 3 == 0);
-    if (HasFatalFailure()) return;
-  }
+  forEachInstructionSet([this] {
+    std::mt19937 random(99 + static_cast<unsigned>(GetParam()));
+    std::uniform_int_distribution<std::size_t> side(1, 200);
+    for (int round = 0; round < 40; ++round) {
+      const std::size_t width = side(random), height = side(random);
+      const std::size_t longest = std::max(width, height);
+      const std::size_t radius =
+          round % 5 == 0 ? longest + 1 : std::uniform_int_distribution<std::size_t>(0, 25)(random);
+      // The repeated 3-tap blur runs radius passes: keep it cheap.
+      const std::size_t used = GetParam() == Filter::gaussian ? std::min<std::size_t>(radius, 12) : radius;
+      expectSameAsReference(random, GetParam(), width, height, used, round % 3 == 0);
+      if (HasFatalFailure()) return;
+    }
+  });
+}
+
+// Packed samples take the transposing row path in groups of 16 rows and 16
+// columns within strips of 64 rows; sizes around those edges leave partial
+// groups and strips on both sides.
+TEST_P(BlurFamilyMatchesReference, PackedSamplesAroundTransposeEdges) {
+  const std::size_t sides[] = {1, 15, 16, 17, 63, 64, 65, 97};
+  forEachInstructionSet([&] {
+    std::mt19937 random(5 + static_cast<unsigned>(GetParam()));
+    for (const std::size_t width : sides) {
+      for (const std::size_t height : sides) {
+        const std::size_t radius = std::uniform_int_distribution<std::size_t>(0, 9)(random);
+        const Layout in{width, height, 1, width + (height % 3), 0};
+        const Layout out{width, height, 1, width + (width % 4), 0};
+        const auto source = randomBytes(random, in.bytes(), 0);
+        auto expected = randomBytes(random, out.bytes(), 0);
+        auto actual = expected;
+        kxa::ipl::referenceFilter(GetParam(), source.data(), expected.data(), width, height, 1, 1,
+                                  in.rowBytes, out.rowBytes, radius);
+        runPublic(GetParam(), source.data(), actual.data(), in, out, radius);
+        ASSERT_EQ(expected, actual) << describe(GetParam(), in, out, radius);
+      }
+    }
+  });
+}
+
+using PixelFilter = void (*)(const uint8_t*, uint8_t*, size_t, size_t, size_t, size_t, size_t);
+
+PixelFilter pixelFilterFor(Filter filter) {
+  return filter == Filter::box        ? IPLBoxBlur32BitAlphaFirstImage
+         : filter == Filter::gaussian ? IPLGaussianBlur32BitAlphaFirstImage
+         : filter == Filter::erode    ? IPLErode32BitAlphaFirstImage
+                                      : IPLDilate32BitAlphaFirstImage;
+}
+
+// The whole-pixel forms must equal four one-channel reference runs, one per
+// byte of the pixel, with the row padding left alone.
+TEST_P(BlurFamilyMatchesReference, WholePixelsEqualFourChannels) {
+  forEachInstructionSet([this] {
+    std::mt19937 random(77 + static_cast<unsigned>(GetParam()));
+    std::uniform_int_distribution<std::size_t> side(1, 90);
+    for (int round = 0; round < 30; ++round) {
+      const std::size_t width = round < 4 ? 1 + static_cast<std::size_t>(round) * 5 : side(random);
+      const std::size_t height = round < 4 ? 40 - static_cast<std::size_t>(round) * 13 : side(random);
+      const std::size_t longest = std::max(width, height);
+      std::size_t radius =
+          round % 6 == 0 ? longest + 2 : std::uniform_int_distribution<std::size_t>(0, 12)(random);
+      if (GetParam() == Filter::gaussian) radius = std::min<std::size_t>(radius, 10);
+      const bool inPlace = round % 3 == 1;
+      const std::size_t inRow = width * 4 + std::uniform_int_distribution<std::size_t>(0, 7)(random);
+      const std::size_t outRow = inPlace ? inRow : width * 4 + std::uniform_int_distribution<std::size_t>(0, 7)(random);
+      const auto source = randomBytes(random, height * inRow, round % 3);
+      auto expected = inPlace ? source : randomBytes(random, height * outRow, 0);
+      auto actual = expected;
+      for (std::size_t channel = 0; channel < 4; ++channel) {
+        const std::uint8_t* from = (inPlace ? expected.data() : source.data()) + channel;
+        kxa::ipl::referenceFilter(GetParam(), from, expected.data() + channel, width, height, 4, 4, inRow,
+                                  outRow, radius);
+      }
+      pixelFilterFor(GetParam())(inPlace ? actual.data() : source.data(), actual.data(), width, height,
+                                 inRow, outRow, radius);
+      ASSERT_EQ(expected, actual) << "filter " << static_cast<int>(GetParam()) << " size " << width << "x"
+                                  << height << " rows " << inRow << "/" << outRow << " radius " << radius
+                                  << (inPlace ? " in place" : "");
+    }
+  });
 }
 
 INSTANTIATE_TEST_SUITE_P(Filters, BlurFamilyMatchesReference,
@@ -168,6 +253,20 @@ TEST(BlurFamily, BoxBlurRadiusPastTheLineKeepsMirroring) {
   IPLBoxBlur(line, out, 2, 1, 1, 1, 2, 2, 2);
   EXPECT_EQ(out[0], 153);  // (255 + 0 + 0 + 255 + 255) / 5 = 153
   EXPECT_EQ(out[1], 102);  // (0 + 0 + 255 + 255 + 0) / 5 = 102
+}
+
+TEST(BlurFamily, WholePixelFormsIgnoreEmptyImagesAndHugeBlurRadii) {
+  std::vector<std::uint8_t> image{1, 2, 3, 4, 5, 6, 7, 8};
+  const auto original = image;
+  for (const Filter filter : {Filter::box, Filter::gaussian, Filter::erode, Filter::dilate}) {
+    pixelFilterFor(filter)(image.data(), image.data(), 0, 2, 4, 4, 1);
+    pixelFilterFor(filter)(image.data(), image.data(), 1, 0, 4, 4, 1);
+  }
+  IPLBoxBlur32BitAlphaFirstImage(image.data(), image.data(), 1, 2, 4, 4, IPLMaximumBlurRadius + 1);
+  IPLGaussianBlur32BitAlphaFirstImage(image.data(), image.data(), 1, 2, 4, 4, IPLMaximumBlurRadius + 1);
+  EXPECT_EQ(image, original);
+  IPLDilate32BitAlphaFirstImage(image.data(), image.data(), 1, 2, 4, 4, SIZE_MAX / 4);
+  EXPECT_EQ(image, (std::vector<std::uint8_t>{5, 6, 7, 8, 5, 6, 7, 8}));
 }
 
 TEST(BlurFamily, HugeRadiiAreHarmless) {
