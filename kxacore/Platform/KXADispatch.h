@@ -2,15 +2,24 @@
 // Dispatch: serial and global queues, groups, delayed calls, timer sources,
 // and run loops, one of which is the main queue that the host turns.
 //
-// Serial and global queues run on a process-wide Asio thread pool (a serial
-// queue is a strand over it). The main queue is the run loop returned by
+// Serial and global queues run on a process-wide Asio thread pool of
+// max(4, hardware threads) threads, made on first use and never torn down.
+// A serial queue is drained by one owner at a time: a job on the pool, or a
+// thread waiting in sync(), which runs its own block (and those queued ahead
+// of it) itself, as platform queues do. So sync() never needs a free pool
+// thread. The main queue is the run loop returned by
 // KXARunLoop::main(): nothing on it runs until some thread turns it with one
 // of the run calls, and that thread is "the main thread" while it does.
 // Everything the library says happens "on the main thread" is posted there.
 //
 // Every call here may be made from any thread unless its comment says
 // otherwise. Blocks are copied (moved) into the queue and destroyed on the
-// queue's thread after they ran, or when they are cancelled.
+// queue's thread after they ran, or when they are cancelled. Empty blocks
+// are ignored. A block must not throw: an exception escaping a block ends
+// the process (std::terminate), as it would on a platform queue.
+//
+// Deadlocks are the caller's to avoid, as with any dispatch library: sync()
+// onto a serial queue that is itself waiting for the caller never returns.
 
 #include <chrono>
 #include <cstddef>
@@ -24,8 +33,10 @@ using KXADispatchBlock = std::function<void()>;
 class KXADispatchGroup;
 
 /// A delayed call as returned by KXADispatchQueue::asyncAfter. cancel()
-/// before the call started keeps it from running; after it started it has
-/// no effect. Either way the call is never run twice.
+/// before the call started keeps it from running and releases the block at
+/// once; after it started it has no effect. Either way the call is never
+/// run twice. isCancelled() is true only when a cancel() kept the call from
+/// running, so a caller can tell whether its cancel came in time.
 class KXADispatchWorkItem {
 public:
     virtual ~KXADispatchWorkItem() = default;
@@ -62,10 +73,12 @@ public:
     /// Runs the block on the queue and waits for it. Called from the queue
     /// itself (isCurrent()), the block runs at once instead of deadlocking.
     /// On the main queue from a thread that is not turning it, this waits
-    /// until the host turns it.
+    /// until the host turns it. A global queue runs the block on the calling
+    /// thread (it is concurrent, so nothing is gained by moving it).
     virtual void sync(KXADispatchBlock block) = 0;
     /// Runs the block on the queue once the delay has passed (measured on
-    /// the steady clock). The returned item cancels it.
+    /// the steady clock; a negative delay counts as zero). The returned item
+    /// cancels it; dropping the item does not.
     virtual std::shared_ptr<KXADispatchWorkItem> asyncAfter(std::chrono::nanoseconds delay,
                                                             KXADispatchBlock block) = 0;
     /// True when the calling thread is running a block of this queue (for the
@@ -77,7 +90,10 @@ protected:
 };
 
 /// Counts outstanding work: enter() before, leave() after; wait() returns
-/// when the count is zero. Entering and leaving must balance.
+/// when the count is zero. Entering and leaving must balance; a leave()
+/// with nothing entered is ignored. Work queued through
+/// KXADispatchQueue::async(group, block) keeps the group's count alive, so
+/// the group object may be destroyed before that work ran.
 class KXADispatchGroup {
 public:
     KXADispatchGroup();
@@ -96,6 +112,7 @@ public:
     void notify(const std::shared_ptr<KXADispatchQueue>& queue, KXADispatchBlock block);
 
 private:
+    friend class KXADispatchQueue;
     struct State;
     std::shared_ptr<State> state_;
 };
@@ -105,7 +122,17 @@ private:
 /// suspend count, starting at 1); cancel() ends it for good, and the event
 /// handler never runs after cancel() returned, except a call already
 /// running on another thread. Firing times follow the wall clock start and
-/// then every interval; `leeway` is the slack the source may add.
+/// then every interval; `leeway` is the slack the source may add (this one
+/// adds none: it fires as soon as its queue gets to it).
+///
+/// Choices where a platform source would crash or is silent: a resume()
+/// past a suspend count of zero is ignored; calls after cancel() do
+/// nothing; a source suspended while an event was due fires once on
+/// resume() and then keeps to its schedule (missed events are coalesced,
+/// never replayed); an interval of zero or less fires once only. The
+/// handler never runs concurrently with itself, even on a global queue.
+/// The source is not kept alive by its schedule: dropping the last
+/// shared_ptr stops it. timerOnQueue(nullptr) returns nullptr.
 class KXADispatchTimerSource {
 public:
     static std::shared_ptr<KXADispatchTimerSource> timerOnQueue(std::shared_ptr<KXADispatchQueue> queue);
@@ -124,7 +151,9 @@ public:
 /// has its own (current()); main() is the loop behind the main queue and is
 /// turned by the host's main thread or a test. Turning a loop from inside
 /// one of its own blocks (nesting) is allowed; two threads turning the same
-/// loop at once take turns.
+/// loop at once take turns: they run one block at a time each, so the
+/// loop's blocks still run one after another in the order queued. A
+/// thread's own loop lives as long as the thread.
 class KXARunLoop {
 public:
     /// The loop the calling thread is turning; main() while it turns the
@@ -143,7 +172,9 @@ public:
     virtual std::size_t runUntilIdle() = 0;
     /// Runs blocks and due timers until `duration` has passed.
     virtual void runFor(std::chrono::nanoseconds duration) = 0;
-    /// Runs blocks until `condition` holds (checked after each block and when
-    /// idle) or `timeout` passed; returns whether the condition held.
+    /// Runs blocks until `condition` holds (checked first, after each block,
+    /// and every millisecond while idle, so a condition set by another
+    /// thread is noticed without posting) or `timeout` passed; returns
+    /// whether the condition held.
     virtual bool runUntil(const std::function<bool()>& condition, std::chrono::nanoseconds timeout) = 0;
 };
