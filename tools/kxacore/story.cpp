@@ -237,8 +237,10 @@ void runNew(const std::string& package, const std::string& id, const std::string
   if (!KXFLibZipArchiver::isSafeEntryName(imageName)) throw KXACommandError("--id makes an unusable entry name");
 
   const Json story = {{"id", id}, {"imageFileName", imageName}, {"spots", Json::array()}, {"persons", Json::array()}};
-  const fs::path partial = url.parent_path() / ("." + url.filename().string() + ".new");
-  const fs::path description = url.parent_path() / ("." + url.filename().string() + ".Data.json");
+  std::string hidden(".");  // appended piece by piece: GCC 12 misreads "." + string at -O3
+  hidden.append(url.filename().string());
+  const fs::path partial = url.parent_path() / (hidden + ".new");
+  const fs::path description = url.parent_path() / (hidden + ".Data.json");
   bool made = false;
   {
     std::ofstream stream(description, std::ios::binary | std::ios::trunc);

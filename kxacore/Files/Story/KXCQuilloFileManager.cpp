@@ -165,6 +165,14 @@ std::string lowercase(std::string text) {
   return text;
 }
 
+// ".NAME" + suffix beside `path`; appended piece by piece because GCC 12
+// misreads `"." + string` at -O3 (a false -Wrestrict).
+fs::path hiddenSibling(const fs::path& path, std::string_view suffix) {
+  std::string name(".");
+  name.append(path.filename().string()).append(suffix);
+  return path.parent_path() / name;
+}
+
 std::string backupNameFor(const std::string& imageName) {
   const fs::path name(imageName);
   return name.stem().string() + "_backup" + name.extension().string();
@@ -174,7 +182,9 @@ std::string backupNameFor(const std::string& imageName) {
 // whole at every moment.
 bool replaceFileWithCopy(const fs::path& source, const fs::path& target) {
   std::error_code error;
-  const fs::path temporary = target.parent_path() / ("." + target.filename().string() + "." + uuidString());
+  std::string suffix(".");
+  suffix.append(uuidString());
+  const fs::path temporary = hiddenSibling(target, suffix);
   if (!fs::copy_file(source, temporary, fs::copy_options::overwrite_existing, error)) {
     fs::remove(temporary, error);
     return false;
@@ -186,6 +196,17 @@ bool replaceFileWithCopy(const fs::path& source, const fs::path& target) {
     return false;
   }
   return true;
+}
+
+// A process killed mid-save leaves its working copy behind; no save takes
+// an hour, so older copies belong to nobody.
+void removeAbandonedWorkingCopies(const fs::path& replacementFolder) {
+  const auto cutoff = fs::file_time_type::clock::now() - std::chrono::hours(1);
+  std::error_code error;
+  for (const auto& entry : fs::directory_iterator(replacementFolder, error)) {
+    std::error_code ignored;
+    if (entry.last_write_time(ignored) < cutoff && !ignored) fs::remove(entry.path(), ignored);
+  }
 }
 
 }  // namespace
@@ -330,9 +351,10 @@ bool KXCQuilloFileManager::updateArchiveAtURL(const fs::path& url,
   std::error_code error;
   if (!fs::is_regular_file(url, error)) return false;
   // Beside the package, so the final rename stays on one file system.
-  const fs::path replacementFolder = url.parent_path() / ("." + url.filename().string() + ".kxa-replace");
+  const fs::path replacementFolder = hiddenSibling(url, ".kxa-replace");
   fs::create_directory(replacementFolder, error);
   if (error) return false;
+  removeAbandonedWorkingCopies(replacementFolder);
   const fs::path workingCopy = replacementFolder / uuidString();
 
   bool succeeded = fs::copy_file(url, workingCopy, error) && !error;

@@ -264,6 +264,21 @@ TEST_F(KXCQuilloArchiveTest, RefusedOrFailedEditLeavesPackageUntouched) {
                                                         [](KXFLibZipArchiver&) { return true; }));
 }
 
+TEST_F(KXCQuilloArchiveTest, AbandonedWorkingCopiesGoOnTheNextWrite) {
+  const fs::path replacement = folder_.path() / ".s.quillo.kxa-replace";
+  fs::create_directory(replacement);
+  writeText(replacement / "abandoned", "left by a killed save");
+  writeText(replacement / "busy", "another writer's copy");
+  fs::last_write_time(replacement / "abandoned", fs::file_time_type::clock::now() - std::chrono::hours(2));
+  writeText(folder_.path() / "Data.json", R"({"id":"s","v":1})");
+  ASSERT_TRUE(KXCQuilloFileManager::updateArchiveAtURL(package_, nullptr, [&](KXFLibZipArchiver& archiver) {
+    return archiver.addFileToArchiveAtPath(folder_.path() / "Data.json", "Data.json", true);
+  }));
+  EXPECT_FALSE(fs::exists(replacement / "abandoned"));
+  EXPECT_TRUE(fs::exists(replacement / "busy"));
+  EXPECT_EQ(entriesOf(package_)["Data.json"], R"({"id":"s","v":1})");
+}
+
 TEST_F(KXCQuilloArchiveTest, ImageEditsBackUpOnceAndRevert) {
   const fs::path third = writeImage(folder_.path() / "third.png", 6, 6);
   ASSERT_TRUE(KXCQuilloFileManager::updateImageForQuilloFileAtURL(package_, nullptr, replacement_, firstReplacement(),
