@@ -38,15 +38,18 @@ KXAImage::KXAImage(std::size_t width, std::size_t height, KXAPixelLayout layout,
   bytes_.assign(rowBytes_ * height_, 0);
 }
 
-std::optional<KXAImage> KXAImage::imageWithContentsOfFile(const std::filesystem::path& path,
-                                                          Load mode, std::string* error) {
+namespace {
+
+// Decodes what `open` returns into an image value of the layout `mode` asks for.
+template <typename Open>
+std::optional<KXAImage> decodedImage(const Open& open, KXAImage::Load mode, std::string* error) {
+  using Load = KXAImage::Load;
   if (!startVips()) {
     setError(error, "the image library could not start");
     return std::nullopt;
   }
   try {
-    vips::VImage image = vips::VImage::new_from_file(
-        path.c_str(), vips::VImage::option()->set("access", VIPS_ACCESS_SEQUENTIAL));
+    vips::VImage image = open();
     const bool grey = mode == Load::grey || (mode == Load::asStored && image.bands() == 1);
     // Converting the colour space also brings 16-bit files to 8 bits.
     image = image.colourspace(grey ? VIPS_INTERPRETATION_B_W : VIPS_INTERPRETATION_sRGB);
@@ -88,6 +91,35 @@ std::optional<KXAImage> KXAImage::imageWithContentsOfFile(const std::filesystem:
     setError(error, failure.what());
     return std::nullopt;
   }
+}
+
+}  // namespace
+
+std::optional<KXAImage> KXAImage::imageWithContentsOfFile(const std::filesystem::path& path,
+                                                          Load mode, std::string* error) {
+  return decodedImage(
+      [&] {
+        return vips::VImage::new_from_file(
+            path.c_str(), vips::VImage::option()->set("access", VIPS_ACCESS_SEQUENTIAL));
+      },
+      mode, error);
+}
+
+std::optional<KXAImage> KXAImage::thumbnailWithContentsOfFile(const std::filesystem::path& path,
+                                                              std::size_t maxSide, Load mode,
+                                                              std::string* error) {
+  if (maxSide == 0 || maxSide > INT_MAX) {
+    setError(error, "the thumbnail size is out of range");
+    return std::nullopt;
+  }
+  const int side = static_cast<int>(maxSide);
+  return decodedImage(
+      [&] {
+        // Shrink-on-load where the format allows it; never enlarges.
+        return vips::VImage::thumbnail(
+            path.c_str(), side, vips::VImage::option()->set("height", side)->set("size", VIPS_SIZE_DOWN));
+      },
+      mode, error);
 }
 
 bool KXAImage::writeToFile(const std::filesystem::path& path, std::string* error) const {

@@ -47,6 +47,13 @@ class KXAImage {
   [[nodiscard]] static std::optional<KXAImage> imageWithContentsOfFile(
       const std::filesystem::path& path, Load mode = Load::asStored, std::string* error = nullptr);
 
+  // The image at `path` scaled down, aspect kept, so that neither side
+  // exceeds `maxSide` pixels (a smaller image keeps its size). Layout and
+  // failures as for imageWithContentsOfFile; nullopt for a maxSide of 0.
+  [[nodiscard]] static std::optional<KXAImage> thumbnailWithContentsOfFile(
+      const std::filesystem::path& path, std::size_t maxSide, Load mode = Load::asStored,
+      std::string* error = nullptr);
+
   // Writes the image in the format its extension names (".png", ".jpg" ...),
   // replacing the file atomically. JPEG drops alpha. False (with `error`)
   // when encoding or writing fails; the target is then untouched.

@@ -26,6 +26,7 @@ void registerLogCommands(CLI::App& app);
 void registerGedcomCommands(CLI::App& app);
 void registerZipCommands(CLI::App& app);
 void registerImageCommands(CLI::App& app);
+void registerStoryCommands(CLI::App& app);
 // Verb added under "zip" (registerZipCommands creates it).
 void registerZipEditCommand(CLI::App& zipCommand);
 // Verbs added under "date" (registerDateCommands creates it).

@@ -52,6 +52,7 @@ int main(int argc, char** argv) {
   registerZipCommands(app);
   registerZipEditCommand(*app.get_subcommand("zip"));  // registerZipCommands made it
   registerImageCommands(app);
+  registerStoryCommands(app);
   const CliLogging logging;
   try {
     app.parse(argc, argv);
