@@ -10,6 +10,8 @@
 // uncompressed bytes.
 
 #include <benchmark/benchmark.h>
+
+#include "bench/KXABenchReporter.h"
 #include <zlib.h>
 
 #include <cstdio>
@@ -133,34 +135,12 @@ BENCHMARK(BM_RawDeflate)->Unit(benchmark::kMillisecond)->UseRealTime();
 BENCHMARK(BM_ExtractArchive)->Unit(benchmark::kMillisecond)->UseRealTime();
 BENCHMARK(BM_UnzipExtract)->Unit(benchmark::kMillisecond)->UseRealTime();
 
-// Prints as usual, and remembers each benchmark's bytes per second for the ratios.
-class RatioReporter : public benchmark::ConsoleReporter {
- public:
-  void ReportRuns(const std::vector<Run>& runs) override {
-    ConsoleReporter::ReportRuns(runs);
-    for (const Run& run : runs) {
-      const auto it = run.counters.find("bytes_per_second");
-      if (it != run.counters.end()) rates_[run.benchmark_name()] = it->second.value;
-    }
-  }
-  void printRatio(const char* what, const char* name, const char* baseline, const char* peer) const {
-    const auto a = rates_.find(name);
-    const auto b = rates_.find(baseline);
-    if (a == rates_.end() || b == rates_.end() || b->second <= 0) return;
-    std::printf("%-18s %7.1f MB/s  %-12s %7.1f MB/s  ratio %.2fx\n", what, a->second / 1e6, peer, b->second / 1e6,
-                a->second / b->second);
-  }
-
- private:
-  std::map<std::string, double> rates_;
-};
-
 }  // namespace
 
 int main(int argc, char** argv) {
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  RatioReporter reporter;
+  KXABenchReporter reporter;
   benchmark::RunSpecifiedBenchmarks(&reporter);
   std::printf("\ninput: %s, level %d\n",
               fs::exists(kShared / "Queen.ged") ? "shared GEDCOM sample, tiled to 32 MiB" : "generated text, 32 MiB",

@@ -13,6 +13,8 @@
 
 #include <benchmark/benchmark.h>
 
+#include "bench/KXABenchReporter.h"
+
 #include <cstdint>
 #include <cstdio>
 #include <map>
@@ -270,45 +272,26 @@ BENCHMARK(BM_IntegerKeysMapTable)->Name("IntegerKeys/IntegerMapTable");
 BENCHMARK(BM_IntegerKeys<std::unordered_map<std::int64_t, std::int64_t>>)->Name("IntegerKeys/std::unordered_map");
 BENCHMARK(BM_IntegerKeys<std::map<std::int64_t, std::int64_t>>)->Name("IntegerKeys/std::map");
 
-// Prints as usual, and remembers each benchmark's items per second for the ratios.
-class RatioReporter : public benchmark::ConsoleReporter {
- public:
-  void ReportRuns(const std::vector<Run>& runs) override {
-    ConsoleReporter::ReportRuns(runs);
-    for (const Run& run : runs) {
-      const auto it = run.counters.find("items_per_second");
-      if (it != run.counters.end()) rates_[run.benchmark_name()] = it->second.value;
-    }
-  }
-  void printRatio(const std::string& what, const std::string& name, const std::string& baseline,
-                  const char* baselineLabel) const {
-    const auto a = rates_.find(name);
-    const auto b = rates_.find(baseline);
-    if (a == rates_.end() || b == rates_.end() || b->second <= 0) return;
-    std::printf("%-40s %8.1f M/s  %-18s %8.1f M/s  ratio %.2fx\n", what.c_str(), a->second / 1e6, baselineLabel,
-                b->second / 1e6, a->second / b->second);
-  }
-
- private:
-  std::map<std::string, double> rates_;
-};
-
 }  // namespace
 
 int main(int argc, char** argv) {
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  RatioReporter reporter;
+  KXABenchReporter reporter;
   benchmark::RunSpecifiedBenchmarks(&reporter);
+  const auto printItemsRatio = [&reporter](const std::string& what, const std::string& ours,
+                                            const std::string& peer, const std::string& label) {
+    reporter.printRatio(what, ours, peer, label, "items_per_second", 1e6, "M/s");
+  };
 
   std::printf("\nlock cycles (KXCRWLock over std::shared_mutex):\n");
   for (const char* kind : {"Read", "Write"}) {
     const std::string ours = std::string("RWLock") + kind;
     const std::string peer = std::string("SharedMutex") + kind;
-    reporter.printRatio(std::string(kind) + ", 1 thread", ours, peer, "shared_mutex");
+    printItemsRatio(std::string(kind) + ", 1 thread", ours, peer, "shared_mutex");
     for (const char* threads : {"2", "4"}) {
       const std::string suffix = std::string("/real_time/threads:") + threads;
-      reporter.printRatio(std::string(kind) + ", " + threads + " threads", ours + suffix, peer + suffix,
+      printItemsRatio(std::string(kind) + ", " + threads + " threads", ours + suffix, peer + suffix,
                           "shared_mutex");
     }
   }
@@ -316,15 +299,15 @@ int main(int argc, char** argv) {
   for (const char* op : {"Set", "Get", "Has", "Enumerate"}) {
     const std::string peer = std::string(op) + "/std::unordered_map";
     for (const char* ours : {"SparseObjectArray", "SparseObjectArraySafed", "DictionaryWithIntKeys"}) {
-      reporter.printRatio(std::string(op) + " " + ours, std::string(op) + "/" + ours, peer, "unordered_map");
+      printItemsRatio(std::string(op) + " " + ours, std::string(op) + "/" + ours, peer, "unordered_map");
     }
-    reporter.printRatio(std::string(op) + " std::map", std::string(op) + "/std::map", peer, "unordered_map");
+    printItemsRatio(std::string(op) + " std::map", std::string(op) + "/std::map", peer, "unordered_map");
   }
   for (const char* op : {"IntegerSetGetHas", "IntegerKeys"}) {
     const std::string peer = std::string(op) + "/std::unordered_map";
-    reporter.printRatio(std::string(op) + " IntegerMapTable", std::string(op) + "/IntegerMapTable", peer,
+    printItemsRatio(std::string(op) + " IntegerMapTable", std::string(op) + "/IntegerMapTable", peer,
                         "unordered_map");
-    reporter.printRatio(std::string(op) + " std::map", std::string(op) + "/std::map", peer, "unordered_map");
+    printItemsRatio(std::string(op) + " std::map", std::string(op) + "/std::map", peer, "unordered_map");
   }
   benchmark::Shutdown();
   return 0;

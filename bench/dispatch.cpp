@@ -11,6 +11,8 @@
 
 #include <benchmark/benchmark.h>
 
+#include "bench/KXABenchReporter.h"
+
 #include <asio/executor_work_guard.hpp>
 #include <asio/io_context.hpp>
 #include <asio/post.hpp>
@@ -125,34 +127,12 @@ BENCHMARK(BM_IoContextPostLatency)->UseRealTime();
 BENCHMARK(BM_SerialQueueThroughput)->Unit(benchmark::kMillisecond)->UseRealTime();
 BENCHMARK(BM_IoContextPostThroughput)->Unit(benchmark::kMillisecond)->UseRealTime();
 
-// Prints as usual, and remembers each benchmark's counters for the ratios.
-class RatioReporter : public benchmark::ConsoleReporter {
- public:
-  void ReportRuns(const std::vector<Run>& runs) override {
-    ConsoleReporter::ReportRuns(runs);
-    for (const Run& run : runs) {
-      for (const auto& [name, counter] : run.counters) values_[run.benchmark_name() + " " + name] = counter.value;
-    }
-  }
-  void printRatio(const char* what, const std::string& ours, const std::string& peer, const char* peerName,
-                  const char* counter, double scale, const char* unit) const {
-    const auto a = values_.find(ours + " " + counter);
-    const auto b = values_.find(peer + " " + counter);
-    if (a == values_.end() || b == values_.end() || b->second <= 0) return;
-    std::printf("%-22s %9.2f %s  %-18s %9.2f %s  ratio %.2fx\n", what, a->second / scale, unit, peerName,
-                b->second / scale, unit, a->second / b->second);
-  }
-
- private:
-  std::map<std::string, double> values_;
-};
-
 }  // namespace
 
 int main(int argc, char** argv) {
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  RatioReporter reporter;
+  KXABenchReporter reporter;
   benchmark::RunSpecifiedBenchmarks(&reporter);
   std::printf("\n");
   reporter.printRatio("main-queue latency", "BM_MainQueueLatency/real_time", "BM_IoContextPostLatency/real_time",

@@ -21,6 +21,8 @@
 
 #include <benchmark/benchmark.h>
 
+#include "bench/KXABenchReporter.h"
+
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
@@ -227,37 +229,23 @@ BENCHMARK(BM_CvDilate4) KXA_RADII;
 BENCHMARK(BM_CvErodeWhite) KXA_RADII;
 #endif
 
-// Prints as usual and remembers each run's real time per iteration in ms.
-class RatioReporter : public benchmark::ConsoleReporter {
- public:
-  void ReportRuns(const std::vector<Run>& runs) override {
-    ConsoleReporter::ReportRuns(runs);
-    for (const Run& run : runs) {
-      if (run.run_type != Run::RT_Iteration || run.iterations == 0) continue;
-      milliseconds_[run.benchmark_name()] = run.cpu_accumulated_time * 1e3 / static_cast<double>(run.iterations);
-    }
-  }
-  // A row whose peer did not run is printed only when showWithoutPeer;
-  // identical is "yes", "no" or empty (not comparable).
-  void printRow(const std::string& ours, const std::string& peer, const std::string& floor,
-                bool showWithoutPeer = true, const char* identical = "") const {
-    const auto mine = milliseconds_.find(ours);
-    if (mine == milliseconds_.end()) return;
-    const auto other = milliseconds_.find(peer);
-    if (other == milliseconds_.end() && !showWithoutPeer) return;
-    const auto copy = milliseconds_.find(floor);
-    std::printf("%-26s %8.1f ms", ours.c_str(), mine->second);
-    if (other != milliseconds_.end()) {
-      std::printf("   %-22s %8.1f ms   ratio %5.2f", peer.c_str(), other->second, mine->second / other->second);
-    }
-    if (copy != milliseconds_.end()) std::printf("   memcpy x%5.1f", mine->second / copy->second);
-    if (other != milliseconds_.end() && *identical) std::printf("   identical: %s", identical);
-    std::printf("\n");
-  }
-
- private:
-  std::map<std::string, double> milliseconds_;
-};
+// One row: ours in CPU ms, the peer and the ratio when the peer ran, and
+// how many memcpy of the same bytes ours costs. A row whose peer did not run
+// is printed only when showWithoutPeer; identical is "yes", "no" or empty
+// (not comparable).
+void printRow(const KXABenchReporter& reporter, const std::string& ours, const std::string& peer,
+              const std::string& floor, bool showWithoutPeer = true, const char* identical = "") {
+  const auto mine = reporter.cpuMilliseconds(ours);
+  if (!mine) return;
+  const auto other = reporter.cpuMilliseconds(peer);
+  if (!other && !showWithoutPeer) return;
+  const auto copy = reporter.cpuMilliseconds(floor);
+  std::printf("%-26s %8.1f ms", ours.c_str(), *mine);
+  if (other) std::printf("   %-22s %8.1f ms   ratio %5.2f", peer.c_str(), *other, *mine / *other);
+  if (copy) std::printf("   memcpy x%5.1f", *mine / *copy);
+  if (other && *identical) std::printf("   identical: %s", identical);
+  std::printf("\n");
+}
 
 // Takes --instruction_set=N out of argv (Google Benchmark refuses flags it
 // does not know) and applies it.
@@ -290,7 +278,7 @@ int main(int argc, char** argv) {
   applyInstructionSet(argc, argv);
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  RatioReporter reporter;
+  KXABenchReporter reporter;
   benchmark::RunSpecifiedBenchmarks(&reporter);
 #ifdef KXA_HAVE_OPENCV
   std::printf("\n%zu x %zu, single-threaded, CPU ms; ratio = ours / OpenCV; identical = same bytes as OpenCV\n",
@@ -315,17 +303,17 @@ int main(int argc, char** argv) {
 #else
       (void)image;
 #endif
-      reporter.printRow("BM_Box" + c + suffix, "BM_CvBox" + c + suffix, "BM_Memcpy" + c, true, sameBox);
-      reporter.printRow("BM_Box" + c + suffix, "BM_CvBlur2D" + c + suffix, "BM_Memcpy" + c, false);
-      reporter.printRow("BM_Repeated3Tap" + c + suffix, "BM_CvBlur2D" + c + suffix, "BM_Memcpy" + c);
-      reporter.printRow("BM_Erode" + c + suffix, "BM_CvErode" + c + suffix, "BM_Memcpy" + c, true, sameErode);
-      reporter.printRow("BM_Dilate" + c + suffix, "BM_CvDilate" + c + suffix, "BM_Memcpy" + c, true, sameDilate);
+      printRow(reporter, "BM_Box" + c + suffix, "BM_CvBox" + c + suffix, "BM_Memcpy" + c, true, sameBox);
+      printRow(reporter, "BM_Box" + c + suffix, "BM_CvBlur2D" + c + suffix, "BM_Memcpy" + c, false);
+      printRow(reporter, "BM_Repeated3Tap" + c + suffix, "BM_CvBlur2D" + c + suffix, "BM_Memcpy" + c);
+      printRow(reporter, "BM_Erode" + c + suffix, "BM_CvErode" + c + suffix, "BM_Memcpy" + c, true, sameErode);
+      printRow(reporter, "BM_Dilate" + c + suffix, "BM_CvDilate" + c + suffix, "BM_Memcpy" + c, true, sameDilate);
     }
     const char* sameWhite = "";
 #ifdef KXA_HAVE_OPENCV
     sameWhite = yesNo(identicalToOpenCV(Ours::erode, CvFilter::erode, whiteMask(), 1, radius));
 #endif
-    reporter.printRow("BM_ErodeWhite" + suffix, "BM_CvErodeWhite" + suffix, "BM_Memcpy1", true, sameWhite);
+    printRow(reporter, "BM_ErodeWhite" + suffix, "BM_CvErodeWhite" + suffix, "BM_Memcpy1", true, sameWhite);
   }
   benchmark::Shutdown();
   return 0;

@@ -10,6 +10,8 @@
 
 #include <benchmark/benchmark.h>
 
+#include "bench/KXABenchReporter.h"
+
 #include <cstdio>
 #include <cstring>
 #include <filesystem>
@@ -130,42 +132,20 @@ BENCHMARK(BM_UTF8LineReading);
 BENCHMARK(BM_Windows1252Decode);
 BENCHMARK(BM_MacRomanDecodeICU);
 
-// Prints as usual, and remembers each benchmark's bytes per second for the ratios.
-class RatioReporter : public benchmark::ConsoleReporter {
- public:
-  void ReportRuns(const std::vector<Run>& runs) override {
-    ConsoleReporter::ReportRuns(runs);
-    for (const Run& run : runs) {
-      const auto it = run.counters.find("bytes_per_second");
-      if (it != run.counters.end()) rates_[run.benchmark_name()] = it->second.value;
-    }
-  }
-  void printRatio(const char* what, const char* name, const char* baseline) const {
-    const auto a = rates_.find(name);
-    const auto b = rates_.find(baseline);
-    if (a == rates_.end() || b == rates_.end() || b->second <= 0) return;
-    std::printf("%-34s %7.1f MB/s  memcpy %8.1f MB/s  ratio %.2fx\n", what, a->second / 1e6, b->second / 1e6,
-                a->second / b->second);
-  }
-
- private:
-  std::map<std::string, double> rates_;
-};
-
 }  // namespace
 
 int main(int argc, char** argv) {
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
-  RatioReporter reporter;
+  KXABenchReporter reporter;
   benchmark::RunSpecifiedBenchmarks(&reporter);
   std::printf("\ninput: %s\n", std::filesystem::exists(kShared / "TGC55C.ged") ? "shared GEDCOM samples, tiled to 32 MiB"
                                                                                  : "generated text, 32 MiB");
-  reporter.printRatio("ANSEL decode", "BM_ANSELDecode", "BM_MemcpyANSELBytes");
-  reporter.printRatio("UTF-8 decode (validate and copy)", "BM_UTF8Decode", "BM_MemcpyUTF8Bytes");
-  reporter.printRatio("UTF-8 line reading", "BM_UTF8LineReading", "BM_MemcpyUTF8Bytes");
-  reporter.printRatio("Windows-1252 decode", "BM_Windows1252Decode", "BM_MemcpyUTF8Bytes");
-  reporter.printRatio("Mac Roman decode (ICU)", "BM_MacRomanDecodeICU", "BM_MemcpyUTF8Bytes");
+  reporter.printRatio("ANSEL decode", "BM_ANSELDecode", "BM_MemcpyANSELBytes", "memcpy");
+  reporter.printRatio("UTF-8 decode (validate and copy)", "BM_UTF8Decode", "BM_MemcpyUTF8Bytes", "memcpy");
+  reporter.printRatio("UTF-8 line reading", "BM_UTF8LineReading", "BM_MemcpyUTF8Bytes", "memcpy");
+  reporter.printRatio("Windows-1252 decode", "BM_Windows1252Decode", "BM_MemcpyUTF8Bytes", "memcpy");
+  reporter.printRatio("Mac Roman decode (ICU)", "BM_MacRomanDecodeICU", "BM_MemcpyUTF8Bytes", "memcpy");
   benchmark::Shutdown();
   return 0;
 }
