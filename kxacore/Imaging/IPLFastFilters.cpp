@@ -129,27 +129,6 @@ void vanHerk(const std::uint8_t* block, std::size_t length, std::size_t radius,
   }
 }
 
-// Small windows: the extreme of 2r + 1 rows directly, cheaper than the
-// prefix and suffix passes of van Herk up to about five rows.
-constexpr std::size_t kDirectMorphologyRadius = 2;
-
-template <bool isMinimum>
-void directExtreme(const std::uint8_t* block, std::size_t radius, std::uint8_t* out, std::size_t count) {
-  const hn::ScalableTag<std::uint8_t> d;
-  const std::size_t n = hn::Lanes(d);
-  for (std::size_t y = 0; y < count; ++y) {
-    for (std::size_t l = 0; l < kStrip; l += n) {
-      auto extreme = hn::LoadU(d, block + y * kStrip + l);
-      for (std::size_t k = 1; k <= 2 * radius; ++k) {
-        const auto row = hn::LoadU(d, block + (y + k) * kStrip + l);
-        if constexpr (isMinimum) extreme = hn::Min(extreme, row);
-        else extreme = hn::Max(extreme, row);
-      }
-      hn::StoreU(extreme, d, out + y * kStrip + l);
-    }
-  }
-}
-
 // `passes` rounds of the rounded 3-tap mean over a padded block; the first
 // and last rows stay as they are (their influence never reaches the output
 // rows, which sit `passes` rows inside the padding). One sweep per pass: a
@@ -284,12 +263,8 @@ void filterBlock(Scratch& scratch, std::size_t count, std::size_t radius,
     boxRunning(block, count, radius, table, scratch.out.data());
   } else {
     zeroRows(block, count, radius);
-    if (radius <= kDirectMorphologyRadius) {
-      directExtreme<kind == Kind::erode>(block, radius, scratch.out.data(), count);
-    } else {
-      vanHerk<kind == Kind::erode>(block, count + 2 * radius, radius, scratch.prefix.data(),
-                                   scratch.suffix.data(), scratch.out.data(), count);
-    }
+    vanHerk<kind == Kind::erode>(block, count + 2 * radius, radius, scratch.prefix.data(),
+                                 scratch.suffix.data(), scratch.out.data(), count);
   }
 }
 
@@ -353,82 +328,124 @@ void scatterRows(const Plane& plane, const RowStrip& strip, const std::uint8_t* 
   }
 }
 
-// Rows of packed samples under small windows need no transposing: the
-// extreme of 2r + 1 neighbours is 2r vector operations on shifted loads of a
-// zero-padded copy of the row (copied first, so in place is safe).
-constexpr std::size_t kDirectRowRadius = 8;
+// Erosion and dilation up to this radius stream through the image once
+// (streamedMorphology); past it the rings of rows would outgrow the caches,
+// and the strips with van Herk take over.
+constexpr std::size_t kStreamedMorphologyRadius = 40;
 
-template <bool isMinimum>
-void directRows(const Plane& plane, std::size_t radius) {
-  const hn::ScalableTag<std::uint8_t> d;
-  const std::size_t n = hn::Lanes(d);
-  const std::size_t channels = plane.channels;
-  const std::size_t bytes = plane.width * channels, pad = radius * channels;
-  const std::size_t chunks = (bytes + n - 1) / n * n;
-  Buffer padded, line;
-  padded.resize(chunks + 2 * pad);
-  line.resize(chunks);
-  for (std::size_t y = 0; y < plane.height; ++y) {
-    std::memcpy(padded.data() + pad, plane.source + y * plane.sourceRowBytes, bytes);
-    for (std::size_t x = 0; x < bytes; x += n) {
-      auto extreme = hn::LoadU(d, padded.data() + x);
-      for (std::size_t k = 1; k <= 2 * radius; ++k) {
-        const auto next = hn::LoadU(d, padded.data() + x + k * channels);
-        if constexpr (isMinimum) extreme = hn::Min(extreme, next);
-        else extreme = hn::Max(extreme, next);
-      }
-      hn::StoreU(extreme, d, line.data() + x);
-    }
-    std::memcpy(plane.destination + y * plane.destinationRowBytes, line.data(), bytes);
-  }
+template <bool isMinimum, class V>
+HWY_INLINE V extremeOf(V a, V b) {
+  if constexpr (isMinimum) return hn::Min(a, b);
+  else return hn::Max(a, b);
 }
 
-// Columns of packed rows under small windows: whole rows at a time, the
-// extreme of rows y - r ... y + r, streaming through memory with no strip
-// copies. Rows above y are already overwritten, so their originals are kept
-// in a ring of r + 1 rows; rows outside the image are zero.
+// out[x] = extreme(a[x], b[x]) over whole vectors covering length bytes: the
+// caller leaves a vector of slack after each. out may be a itself when b
+// lies after a (each vector is loaded before it is stored, and later loads
+// only reach further on).
 template <bool isMinimum>
-void directColumns(const Plane& plane, std::size_t radius) {
+void extremeOfRows(const std::uint8_t* a, const std::uint8_t* b, std::uint8_t* out, std::size_t length) {
   const hn::ScalableTag<std::uint8_t> d;
   const std::size_t n = hn::Lanes(d);
-  const std::size_t bytes = plane.width * plane.channels, height = plane.height;
+  for (std::size_t x = 0; x < length; x += n)
+    hn::StoreU(extremeOf<isMinimum>(hn::LoadU(d, a + x), hn::LoadU(d, b + x)), d, out + x);
+}
+
+// Windows by doubling (a sparse table): level k holds the extreme of 2^k
+// neighbours, and since min and max are idempotent a window of w is the
+// extreme of two overlapping level-K windows, 2^K <= w < 2^(K+1). That is
+// K + 1 vector operations per sample and direction, flat masks included.
+struct DoublingPlan {
+  std::size_t window, levels = 0, top = 1;  // top = 2^levels
+  explicit DoublingPlan(std::size_t radius) : window(2 * radius + 1) {
+    while (top * 2 <= window) {
+      top *= 2;
+      ++levels;
+    }
+  }
+};
+
+// One source row along the row: the zero-padded samples go into line (2 *
+// pad + bytes + a vector of slack), the levels are built there in place, and
+// the window extremes land in out (bytes rounded up to whole vectors).
+template <bool isMinimum>
+void extremesAlongRow(const Plane& plane, const std::uint8_t* row, const DoublingPlan& plan,
+                      std::uint8_t* line, std::uint8_t* out) {
+  const std::size_t channels = plane.channels, bytes = plane.width * channels;
+  const std::size_t pad = (plan.window / 2) * channels, length = bytes + 2 * pad;
+  std::memset(line, 0, pad);
+  if (plane.sourceStep == channels) {
+    std::memcpy(line + pad, row, bytes);
+  } else {
+    for (std::size_t x = 0; x < plane.width; ++x) line[pad + x] = row[x * plane.sourceStep];
+  }
+  std::memset(line + pad + bytes, 0, pad);
+  for (std::size_t k = 1; k <= plan.levels; ++k) {
+    const std::size_t span = std::size_t{1} << k;
+    extremeOfRows<isMinimum>(line, line + span / 2 * channels, line, length - (span - 1) * channels);
+  }
+  extremeOfRows<isMinimum>(line, line + (plan.window - plan.top) * channels, out, bytes);
+}
+
+// Destination row = extreme(a, b), whole vectors straight into the row, the
+// rest (and strided samples) one by one, so row padding is never touched.
+template <bool isMinimum>
+void storeExtremes(const Plane& plane, const std::uint8_t* a, const std::uint8_t* b, std::uint8_t* target) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const std::size_t bytes = plane.width * plane.channels;
+  const auto one = [](std::uint8_t p, std::uint8_t q) { return isMinimum ? std::min(p, q) : std::max(p, q); };
+  if (plane.destinationStep != plane.channels) {
+    for (std::size_t x = 0; x < plane.width; ++x) target[x * plane.destinationStep] = one(a[x], b[x]);
+    return;
+  }
   const std::size_t full = bytes / n * n;
-  Buffer ring, line;
-  ring.resize((radius + 1) * bytes);
-  line.resize(bytes);
-  const std::uint8_t* rows[2 * kDirectRowRadius + 1];
-  const auto destinationRow = [&](std::size_t y) { return plane.destination + y * plane.destinationRowBytes; };
-  for (std::size_t y = 0; y < height; ++y) {
-    std::memcpy(ring.data() + y % (radius + 1) * bytes, destinationRow(y), bytes);
-    std::size_t count = 0;
-    bool outside = false;
-    for (std::size_t k = 0; k <= 2 * radius; ++k) {
-      if (y + k < radius || y + k - radius >= height) {
-        outside = true;
-        continue;
-      }
-      const std::size_t source = y + k - radius;
-      rows[count++] = source <= y ? ring.data() + source % (radius + 1) * bytes : destinationRow(source);
+  for (std::size_t x = 0; x < full; x += n)
+    hn::StoreU(extremeOf<isMinimum>(hn::LoadU(d, a + x), hn::LoadU(d, b + x)), d, target + x);
+  for (std::size_t x = full; x < bytes; ++x) target[x] = one(a[x], b[x]);
+}
+
+// Erosion or dilation in one pass over memory: each source row is read once
+// and filtered along the row into level 0 of a ring of rows (rows outside
+// the image are zero, as the plain form pads them); the column levels are
+// built as rows arrive, and destination row o is written as soon as row
+// o + r is in. Source rows are all read before the destination row of the
+// same index is written, so in place is safe. Level k keeps the 2^k + 1
+// newest of its rows (the top level w - 2^K + 1), about w rows in all.
+template <bool isMinimum>
+void streamedMorphology(const Plane& plane, std::size_t radius) {
+  const hn::ScalableTag<std::uint8_t> d;
+  const std::size_t n = hn::Lanes(d);
+  const std::size_t bytes = plane.width * plane.channels;
+  const std::size_t rowLength = (bytes + n - 1) / n * n + n;
+  const DoublingPlan plan(radius);
+  std::vector<std::size_t> ringRows(plan.levels + 1), ringStart(plan.levels + 1);
+  std::size_t totalRows = 0;
+  for (std::size_t k = 0; k <= plan.levels; ++k) {
+    ringRows[k] = k < plan.levels ? (std::size_t{1} << k) + 1 : plan.window - plan.top + 1;
+    ringStart[k] = totalRows;
+    totalRows += ringRows[k];
+  }
+  Buffer rings, line;
+  rings.resize(totalRows * rowLength);
+  line.resize(bytes + 2 * radius * plane.channels + n);
+  const auto slot = [&](std::size_t level, std::size_t index) {
+    return rings.data() + (ringStart[level] + index % ringRows[level]) * rowLength;
+  };
+  const std::size_t paddedRows = plane.height + 2 * radius;
+  for (std::size_t q = 0; q < paddedRows; ++q) {
+    std::uint8_t* level0 = slot(0, q);
+    if (q < radius || q >= radius + plane.height) std::memset(level0, 0, rowLength);
+    else extremesAlongRow<isMinimum>(plane, plane.source + (q - radius) * plane.sourceRowBytes, plan,
+                                     line.data(), level0);
+    for (std::size_t k = 1; k <= plan.levels && q + 1 >= (std::size_t{1} << k); ++k) {
+      const std::size_t span = std::size_t{1} << k, j = q + 1 - span;
+      extremeOfRows<isMinimum>(slot(k - 1, j), slot(k - 1, j + span / 2), slot(k, j), bytes);
     }
-    if (isMinimum && outside) {
-      std::memset(line.data(), 0, bytes);
-    } else {
-      for (std::size_t x = 0; x < full; x += n) {
-        auto extreme = hn::LoadU(d, rows[0] + x);
-        for (std::size_t i = 1; i < count; ++i) {
-          if constexpr (isMinimum) extreme = hn::Min(extreme, hn::LoadU(d, rows[i] + x));
-          else extreme = hn::Max(extreme, hn::LoadU(d, rows[i] + x));
-        }
-        hn::StoreU(extreme, d, line.data() + x);
-      }
-      for (std::size_t x = full; x < bytes; ++x) {
-        std::uint8_t extreme = rows[0][x];
-        for (std::size_t i = 1; i < count; ++i)
-          extreme = isMinimum ? std::min(extreme, rows[i][x]) : std::max(extreme, rows[i][x]);
-        line.data()[x] = extreme;
-      }
-    }
-    std::memcpy(destinationRow(y), line.data(), bytes);
+    if (q < 2 * radius) continue;
+    const std::size_t o = q - 2 * radius;
+    storeExtremes<isMinimum>(plane, slot(plan.levels, o), slot(plan.levels, o + plan.window - plan.top),
+                             plane.destination + o * plane.destinationRowBytes);
   }
 }
 
@@ -442,20 +459,16 @@ void run(const Plane& plane, std::size_t radius, const std::uint8_t* table) {
   // Rows, kStrip / channels rows at once. Every source row of the strip is
   // read before any destination row is written, so in place is safe.
   const std::size_t rowsPerStrip = kStrip / channels;
-  const bool packedRows = plane.sourceStep == channels && plane.destinationStep == channels;
-  const bool rowsDirect = morphology && packedRows && radius <= kDirectRowRadius;
-  if (rowsDirect) directRows<kind == Kind::erode>(plane, radius);
-  else scratch.reserve(width + 2 * radius, morphology);
-  for (std::size_t first = 0; !rowsDirect && first < height; first += rowsPerStrip) {
+  if (morphology && radius <= kStreamedMorphologyRadius) {
+    streamedMorphology<kind == Kind::erode>(plane, radius);
+    return;
+  }
+  scratch.reserve(width + 2 * radius, morphology);
+  for (std::size_t first = 0; first < height; first += rowsPerStrip) {
     const RowStrip strip{first, std::min(rowsPerStrip, height - first), channels};
     gatherRows(plane, strip, scratch.block.data() + radius * kStrip);
     filterBlock<kind>(scratch, width, radius, table);
     scatterRows(plane, strip, scratch.out.data());
-  }
-
-  if (morphology && plane.destinationStep == channels && radius <= kDirectRowRadius) {
-    directColumns<kind == Kind::erode>(plane, radius);
-    return;
   }
 
   // Columns of the destination in place, kStrip neighbouring bytes at once.
