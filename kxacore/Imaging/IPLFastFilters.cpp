@@ -129,34 +129,68 @@ void vanHerk(const std::uint8_t* block, std::size_t length, std::size_t radius,
   }
 }
 
-// `passes` rounds of the rounded 3-tap mean over a padded block; the first
-// and last rows stay as they are (their influence never reaches the output
-// rows, which sit `passes` rows inside the padding). One sweep per pass: a
-// wavefront of passes kept in L1 measured slower (the block already sits in
-// L2 and the sweep is compute-bound). round(s / 3) for s <= 765 is the high
-// half of (s + 1) * 21846, exact over that range.
-void repeatedThreeTap(std::uint8_t* block, std::size_t length, std::size_t passes,
-                      std::uint8_t* out, std::size_t count) {
+// `Stages` passes of the rounded 3-tap mean in one sweep down a padded
+// block: pass g trails pass g - 1 by one row and keeps the two rows above
+// the one it computes in registers, so each row is loaded, widened, narrowed
+// and stored once per sweep instead of once per pass. The first and last
+// rows stay as they are in every pass (their influence never reaches the
+// output rows, which sit `passes` rows inside the padding). round(s / 3)
+// for s <= 765 is (s * 10923 + 2^14) >> 15, one rounding high multiply.
+template <std::size_t Stages>
+void threeTapSweep(std::uint8_t* block, std::size_t length) {
   const hn::ScalableTag<std::int16_t> d16;
   const hn::Rebind<std::uint8_t, decltype(d16)> d8;
+  using V = hn::Vec<decltype(d16)>;
   const std::size_t n = hn::Lanes(d16);
-  const auto one = hn::Set(d16, 1);
-  const auto third = hn::Set(d16, 21846);
-  HWY_ALIGN std::uint8_t previous[kStrip];
-  for (std::size_t pass = 0; pass < passes; ++pass) {
-    std::memcpy(previous, block, kStrip);
-    for (std::size_t i = 1; i + 1 < length; ++i) {
-      std::uint8_t* row = block + i * kStrip;
-      for (std::size_t l = 0; l < kStrip; l += n) {
-        const auto before = hn::LoadU(d8, previous + l);
-        const auto current = hn::LoadU(d8, row + l);
-        const auto next = hn::LoadU(d8, row + kStrip + l);
-        const auto sum = hn::Add(hn::Add(hn::PromoteTo(d16, before), hn::PromoteTo(d16, current)),
-                                 hn::Add(hn::PromoteTo(d16, next), one));
-        hn::StoreU(current, d8, previous + l);
-        hn::StoreU(hn::DemoteTo(d8, hn::MulHigh(sum, third)), d8, row + l);
+  const auto third = hn::Set(d16, 10923);
+  const std::size_t lastRow = length - 1;
+  for (std::size_t l = 0; l < kStrip; l += n) {
+    const auto row = [&](std::size_t i) { return hn::PromoteTo(d16, hn::LoadU(d8, block + i * kStrip + l)); };
+    const V first = row(0), last = row(lastRow);
+    V left[Stages], middle[Stages];
+    for (std::size_t g = 0; g < Stages; ++g) left[g] = middle[g] = first;
+    // At step t pass g computes row t - g from the row below, which the pass
+    // before it has just produced (or the block holds, for the first pass).
+    for (std::size_t t = 0; t + 2 < length + Stages; ++t) {
+      V below = t < lastRow ? row(t + 1) : last;
+#pragma GCC unroll 8
+      for (std::size_t g = 0; g < Stages; ++g) {
+        if (t < g) break;
+        const std::size_t j = t - g;
+        if (j == 0) {
+          middle[g] = below;
+          below = first;
+        } else if (j < lastRow) {
+          const V mean = hn::MulFixedPoint15(hn::Add(hn::Add(left[g], middle[g]), below), third);
+          left[g] = middle[g];
+          middle[g] = below;
+          below = mean;
+        } else {
+          below = last;
+        }
       }
+      if (t >= Stages && t - (Stages - 1) < lastRow)
+        hn::StoreU(hn::DemoteTo(d8, below), d8, block + (t - (Stages - 1)) * kStrip + l);
     }
+  }
+}
+
+// `passes` rounds of the 3-tap mean over a padded block, written out as the
+// count rows `passes` inside it.
+void repeatedThreeTap(std::uint8_t* block, std::size_t length, std::size_t passes,
+                      std::uint8_t* out, std::size_t count) {
+  constexpr std::size_t kStages = 4;
+  std::size_t left = passes;
+  for (; left >= kStages; left -= kStages) threeTapSweep<kStages>(block, length);
+  switch (left) {
+    case 7: threeTapSweep<7>(block, length); break;
+    case 6: threeTapSweep<6>(block, length); break;
+    case 5: threeTapSweep<5>(block, length); break;
+    case 4: threeTapSweep<4>(block, length); break;
+    case 3: threeTapSweep<3>(block, length); break;
+    case 2: threeTapSweep<2>(block, length); break;
+    case 1: threeTapSweep<1>(block, length); break;
+    default: break;
   }
   std::memcpy(out, block + passes * kStrip, count * kStrip);
 }
