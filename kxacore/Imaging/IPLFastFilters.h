@@ -1,11 +1,14 @@
-// Fast forms of the blur family: O(1) work per sample whatever the radius
-// (except the repeated 3-tap blur, radius passes by definition, and erosion
-// and dilation under radius 9, where the direct extreme is cheaper). Rows and
-// columns are processed as strips of 64 lanes laid side by side (64 lines of
-// one channel, or 16 lines of 4-byte pixels), so the inner loops run over
-// independent lanes as SIMD vectors, compiled for several instruction sets
-// and chosen at run time (Highway). Byte-identical to the plain forms in
-// IPLReference.h on every instruction set (the tests compare them). Internal.
+// Fast forms of the blur family. Erosion and dilation stream through the
+// image once, with log2(2r + 1) + 1 vector operations per sample and
+// direction (windows by doubling, up to radius 128; van Herk strips past
+// it). The box blur keeps running sums, O(1) per sample; the repeated 3-tap
+// blur runs its radius passes, four at a time in registers. Blurs (and
+// morphology past radius 128) work on strips of 64 lanes laid side by side
+// (64 lines of one channel, or 16 lines of 4-byte pixels), so the inner
+// loops run over independent lanes as SIMD vectors. Compiled for several
+// instruction sets and chosen at run time (Highway). Byte-identical to the
+// plain forms in IPLReference.h on every instruction set (the tests compare
+// them). Internal.
 #pragma once
 
 #include <cstddef>
@@ -42,7 +45,8 @@ struct RoundedDivider {
 };
 
 void fastBoxBlur(const Plane& plane, std::size_t radius, const std::uint8_t* divisionTable);
-// The repeated 3-tap blur: still radius passes, but over 64 lanes at once.
+// The repeated 3-tap blur: still radius passes, but over 64 lanes at once
+// and four passes per sweep of memory.
 void fastGaussianBlur(const Plane& plane, std::size_t radius);
 void fastErode(const Plane& plane, std::size_t radius);
 void fastDilate(const Plane& plane, std::size_t radius);

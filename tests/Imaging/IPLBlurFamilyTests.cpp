@@ -128,6 +128,20 @@ TEST_P(BlurFamilyMatchesReference, RandomSizesAcrossColumnStrips) {
   });
 }
 
+// Windows whose length crosses a power of two change the number of doubling
+// levels, and radius 128 is where erosion and dilation leave the streamed
+// ring for the strips; both sides of each edge, on an image wider than them.
+TEST_P(BlurFamilyMatchesReference, RadiiAroundDoublingLevelsAndPathEdges) {
+  forEachInstructionSet([this] {
+    std::mt19937 random(31 + static_cast<unsigned>(GetParam()));
+    int round = 0;
+    for (const std::size_t radius : {3u, 4u, 7u, 8u, 31u, 32u, 127u, 128u, 129u}) {
+      expectSameAsReference(random, GetParam(), 290, 270, radius, ++round % 2 == 0);
+      if (HasFatalFailure()) return;
+    }
+  });
+}
+
 // Packed samples take the transposing row path in groups of 16 rows and 16
 // columns within strips of 64 rows; sizes around those edges leave partial
 // groups and strips on both sides.
