@@ -27,12 +27,14 @@ using kxa::ipl::Filter;
 
 void compareFilter(FuzzedDataProvider& input) {
   const auto filter = static_cast<Filter>(input.ConsumeIntegralInRange<int>(0, 3));
-  const std::size_t width = input.ConsumeIntegralInRange<std::size_t>(1, 48);
-  const std::size_t height = input.ConsumeIntegralInRange<std::size_t>(1, 48);
+  // Wide enough for erosion and dilation past radius 128, where the fast
+  // forms change method.
+  const std::size_t width = input.ConsumeIntegralInRange<std::size_t>(1, 140);
+  const std::size_t height = input.ConsumeIntegralInRange<std::size_t>(1, 40);
   const std::size_t step = input.ConsumeIntegralInRange<std::size_t>(1, 4);
   const std::size_t rowBytes = width * step + input.ConsumeIntegralInRange<std::size_t>(0, 5);
   const std::size_t radius =
-      input.ConsumeIntegralInRange<std::size_t>(0, filter == Filter::gaussian ? 20 : 60);
+      input.ConsumeIntegralInRange<std::size_t>(0, filter == Filter::gaussian ? 20 : 150);
   const bool inPlace = input.ConsumeBool();
   std::vector<std::uint8_t> source(rowBytes * height);
   for (auto& byte : source) byte = input.ConsumeIntegral<std::uint8_t>();
