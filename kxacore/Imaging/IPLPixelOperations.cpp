@@ -4,6 +4,8 @@
 
 #include "kxacore/Imaging/IPLPixelOperations.h"
 
+#include "kxacore/Imaging/IPLFastPixels.h"
+
 #include <algorithm>
 #include <array>
 #include <cmath>
@@ -26,24 +28,29 @@ inline std::uint8_t demultiplied(unsigned colour, unsigned alpha) {
   return static_cast<std::uint8_t>(static_cast<std::uint16_t>(wide / alpha));
 }
 
-// Visits every pixel of two 32-bit images of the same size.
-template <typename PixelFunction>
+// Visits every pixel of two 32-bit images of the same size. fastRow(in,
+// out, width) may do a leading part of each row with SIMD and returns how
+// many pixels it did; function does the rest one pixel at a time.
+template <typename FastRow, typename PixelFunction>
 void forEachPixel(const std::uint8_t* source, std::uint8_t* destination, std::size_t width,
                   std::size_t height, std::size_t sourceRowBytes, std::size_t destinationRowBytes,
-                  PixelFunction&& function) {
+                  FastRow&& fastRow, PixelFunction&& function) {
   for (std::size_t y = 0; y < height; ++y) {
     const std::uint8_t* in = source + y * sourceRowBytes;
     std::uint8_t* out = destination + y * destinationRowBytes;
-    for (std::size_t x = 0; x < width; ++x) function(in + 4 * x, out + 4 * x);
+    for (std::size_t x = fastRow(in, out, width); x < width; ++x) function(in + 4 * x, out + 4 * x);
   }
 }
+
+// For operations with no SIMD form.
+constexpr auto kNoFastRow = [](const std::uint8_t*, std::uint8_t*, std::size_t) -> std::size_t { return 0; };
 
 // Three 256-entry colour tables, alpha copied.
 void applyTables(const std::uint8_t* source, std::uint8_t* destination, std::size_t width,
                  std::size_t height, std::size_t sourceRowBytes, std::size_t destinationRowBytes,
                  const std::array<std::uint8_t, 256>& red, const std::array<std::uint8_t, 256>& green,
                  const std::array<std::uint8_t, 256>& blue) {
-  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
+  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes, kNoFastRow,
                [&](const std::uint8_t* in, std::uint8_t* out) {
                  const std::uint8_t a = in[kAlpha], r = in[kRed], g = in[kGreen], b = in[kBlue];
                  out[kAlpha] = a;
@@ -92,11 +99,16 @@ void IPLApply8BitMaskTo32BitAlphaFirstImage(const uint8_t* image, const uint8_t*
                                             size_t imageRowBytes, size_t maskStep,
                                             size_t maskRowBytes, size_t destinationRowBytes,
                                             int useImageAlpha, int scaleColors, int invert) {
+  using kxa::ipl::MaskMode;
+  const MaskMode maskMode = useImageAlpha ? (scaleColors ? MaskMode::scaleAll : MaskMode::scaleAlpha)
+                                          : (scaleColors ? MaskMode::plainAlphaColours : MaskMode::maskAsAlpha);
   for (std::size_t y = 0; y < height; ++y) {
     const std::uint8_t* in = image + y * imageRowBytes;
     const std::uint8_t* maskRow = mask + y * maskRowBytes;
     std::uint8_t* out = destination + y * destinationRowBytes;
-    for (std::size_t x = 0; x < width; ++x) {
+    const std::size_t done =
+        maskStep == 1 ? kxa::ipl::fastMaskPixels(in, maskRow, out, width, maskMode, invert != 0) : 0;
+    for (std::size_t x = done; x < width; ++x) {
       const std::uint8_t* pixel = in + 4 * x;
       std::uint8_t* target = out + 4 * x;
       const unsigned plain = maskRow[x * maskStep];
@@ -131,7 +143,9 @@ void IPLCombine8BitMasks(const uint8_t* maskA, const uint8_t* maskB, uint8_t* de
     const std::uint8_t* a = maskA + y * maskARowBytes;
     const std::uint8_t* b = maskB + y * maskBRowBytes;
     std::uint8_t* out = destination + y * destinationRowBytes;
-    for (std::size_t x = 0; x < width; ++x) {
+    const std::size_t done =
+        kxa::ipl::fastCombineMasks(a, b, out, width, invertA != 0, invertB != 0, invertResult != 0);
+    for (std::size_t x = done; x < width; ++x) {
       const unsigned first = invertA ? 255u - a[x] : a[x];
       const unsigned second = invertB ? 255u - b[x] : b[x];
       const std::uint8_t combined = scale(first, second);
@@ -163,7 +177,7 @@ void IPLDemultiplyAlphaFrom32BitAlphaFirstImage(const uint8_t* source, uint8_t* 
                                                 size_t width, size_t height,
                                                 size_t sourceRowBytes,
                                                 size_t destinationRowBytes) {
-  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
+  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes, kNoFastRow,
                [](const std::uint8_t* in, std::uint8_t* out) {
                  const std::uint8_t a = in[kAlpha], r = in[kRed], g = in[kGreen], b = in[kBlue];
                  out[kAlpha] = a;
@@ -178,7 +192,7 @@ void IPLRemoveBackgroundColorFrom32BitAlphaFirstImage(const uint8_t* source,
                                                       size_t height, size_t sourceRowBytes,
                                                       size_t destinationRowBytes, uint8_t red,
                                                       uint8_t green, uint8_t blue) {
-  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
+  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes, kNoFastRow,
                [&](const std::uint8_t* in, std::uint8_t* out) {
                  const std::uint8_t a = in[kAlpha], r = in[kRed], g = in[kGreen], b = in[kBlue];
                  out[kAlpha] = a;
@@ -263,10 +277,15 @@ void IPLApplyTintTo32BitAlphaFirstImage(const uint8_t* source, uint8_t* destinat
   const unsigned t = amount;
   const unsigned keep = 255 - t;
   const auto capped = [](unsigned value) { return static_cast<std::uint8_t>(std::min(value, 255u)); };
+  const auto fastRow = [amount](kxa::ipl::TintMode mode) {
+    return [amount, mode](const std::uint8_t* in, std::uint8_t* out, std::size_t count) {
+      return kxa::ipl::fastTintPixels(in, out, count, mode, amount);
+    };
+  };
   if (!sourcePremultiplied && !premultiply) {
     if (t == 0) return;
     forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
-                 [&](const std::uint8_t* in, std::uint8_t* out) {
+                 fastRow(kxa::ipl::TintMode::straight), [&](const std::uint8_t* in, std::uint8_t* out) {
                    const std::uint8_t a = in[kAlpha];
                    for (std::size_t i = kRed; i <= kBlue; ++i) out[i] = capped(scale(keep, in[i]) + t);
                    out[kAlpha] = a;
@@ -274,7 +293,7 @@ void IPLApplyTintTo32BitAlphaFirstImage(const uint8_t* source, uint8_t* destinat
   } else if (!sourcePremultiplied) {
     // Runs for t = 0 too: the colours are then only premultiplied.
     forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
-                 [&](const std::uint8_t* in, std::uint8_t* out) {
+                 fastRow(kxa::ipl::TintMode::premultiplying), [&](const std::uint8_t* in, std::uint8_t* out) {
                    const std::uint8_t a = in[kAlpha];
                    const unsigned lift = scale(a, t);
                    for (std::size_t i = kRed; i <= kBlue; ++i)
@@ -287,7 +306,7 @@ void IPLApplyTintTo32BitAlphaFirstImage(const uint8_t* source, uint8_t* destinat
                                                  sourceRowBytes, destinationRowBytes);
       return;
     }
-    forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
+    forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes, kNoFastRow,
                  [&](const std::uint8_t* in, std::uint8_t* out) {
                    const std::uint8_t a = in[kAlpha];
                    for (std::size_t i = kRed; i <= kBlue; ++i) {
@@ -301,7 +320,7 @@ void IPLApplyTintTo32BitAlphaFirstImage(const uint8_t* source, uint8_t* destinat
   } else {
     if (t == 0) return;
     forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
-                 [&](const std::uint8_t* in, std::uint8_t* out) {
+                 fastRow(kxa::ipl::TintMode::premultiplied), [&](const std::uint8_t* in, std::uint8_t* out) {
                    const std::uint8_t a = in[kAlpha];
                    const unsigned lift = scale(t, a);
                    for (std::size_t i = kRed; i <= kBlue; ++i) out[i] = capped(scale(keep, in[i]) + lift);
@@ -316,7 +335,10 @@ void IPLClearAlphaChannelOf32BitAlphaFirstImage(const uint8_t* source, uint8_t* 
                                                 size_t destinationRowBytes, uint8_t alpha,
                                                 int demultiply, int premultiply) {
   const bool scaleByAlpha = premultiply && alpha < 255;
-  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes,
+  const auto fastRow = [&](const std::uint8_t* in, std::uint8_t* out, std::size_t count) -> std::size_t {
+    return demultiply ? 0 : kxa::ipl::fastClearAlpha(in, out, count, alpha, scaleByAlpha);
+  };
+  forEachPixel(source, destination, width, height, sourceRowBytes, destinationRowBytes, fastRow,
                [&](const std::uint8_t* in, std::uint8_t* out) {
                  const std::uint8_t a = in[kAlpha];
                  std::uint8_t colours[3] = {in[kRed], in[kGreen], in[kBlue]};
