@@ -9,6 +9,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <initializer_list>
 #include <random>
 #include <string>
 #include <vector>
@@ -73,65 +74,51 @@ std::vector<std::uint8_t> randomBytes(std::mt19937& random, std::size_t count) {
   return bytes;
 }
 
-TEST(FastPixels, MaskEveryFlagCombination) {
-  std::mt19937 random(11);
-  for (int round = 0; round < 24; ++round) {
+// Random layouts, each under every flag combination and every level.
+using PixelCall = std::function<void(const Layout&, int flags, int level, std::vector<std::uint8_t>&)>;
+
+void expectSameForLayoutsFlagsAndLevels(unsigned seed, int flagCombinations, std::initializer_list<int> levels,
+                                        const PixelCall& call) {
+  std::mt19937 random(seed);
+  for (int round = 0; round < 16; ++round) {
     const Layout l = randomLayout(random, round);
     const auto start = randomBytes(random, l.total());
-    for (int flags = 0; flags < 8; ++flags) {
-      expectSameOnEveryInstructionSet(
-          start,
-          [&](std::vector<std::uint8_t>& b) {
-            IPLApply8BitMaskTo32BitAlphaFirstImage(b.data(), b.data() + l.maskOffset(), b.data() + l.destinationOffset(),
-                                                   l.width, l.height, l.imageRowBytes, l.maskStep, l.maskRowBytes,
-                                                   l.destinationRowBytes, flags & 1, (flags >> 1) & 1, (flags >> 2) & 1);
-          },
-          "mask flags " + std::to_string(flags) + " width " + std::to_string(l.width));
-      if (HasFatalFailure()) return;
+    for (int flags = 0; flags < flagCombinations; ++flags) {
+      for (const int level : levels) {
+        expectSameOnEveryInstructionSet(
+            start, [&](std::vector<std::uint8_t>& bytes) { call(l, flags, level, bytes); },
+            "flags " + std::to_string(flags) + " level " + std::to_string(level) + " width " +
+                std::to_string(l.width) + (l.inPlace ? " in place" : ""));
+        if (::testing::Test::HasFatalFailure()) return;
+      }
     }
   }
+}
+
+TEST(FastPixels, MaskEveryFlagCombination) {
+  expectSameForLayoutsFlagsAndLevels(11, 8, {0}, [](const Layout& l, int flags, int, std::vector<std::uint8_t>& b) {
+    IPLApply8BitMaskTo32BitAlphaFirstImage(b.data(), b.data() + l.maskOffset(), b.data() + l.destinationOffset(),
+                                           l.width, l.height, l.imageRowBytes, l.maskStep, l.maskRowBytes,
+                                           l.destinationRowBytes, flags & 1, (flags >> 1) & 1, (flags >> 2) & 1);
+  });
 }
 
 TEST(FastPixels, TintEveryFormAndAmount) {
-  std::mt19937 random(12);
-  for (int round = 0; round < 16; ++round) {
-    const Layout l = randomLayout(random, round);
-    const auto start = randomBytes(random, l.total());
-    for (int flags = 0; flags < 4; ++flags) {
-      for (const int amount : {0, 1, 40, 254, 255}) {
-        expectSameOnEveryInstructionSet(
-            start,
-            [&](std::vector<std::uint8_t>& b) {
-              IPLApplyTintTo32BitAlphaFirstImage(b.data(), b.data() + l.destinationOffset(), l.width, l.height,
-                                                 l.imageRowBytes, l.destinationRowBytes, flags & 1, (flags >> 1) & 1,
-                                                 static_cast<std::uint8_t>(amount));
-            },
-            "tint flags " + std::to_string(flags) + " amount " + std::to_string(amount));
-        if (HasFatalFailure()) return;
-      }
-    }
-  }
+  expectSameForLayoutsFlagsAndLevels(
+      12, 4, {0, 1, 40, 254, 255}, [](const Layout& l, int flags, int amount, std::vector<std::uint8_t>& b) {
+        IPLApplyTintTo32BitAlphaFirstImage(b.data(), b.data() + l.destinationOffset(), l.width, l.height,
+                                           l.imageRowBytes, l.destinationRowBytes, flags & 1, (flags >> 1) & 1,
+                                           static_cast<std::uint8_t>(amount));
+      });
 }
 
 TEST(FastPixels, ClearAlphaEveryFormAndLevel) {
-  std::mt19937 random(13);
-  for (int round = 0; round < 16; ++round) {
-    const Layout l = randomLayout(random, round);
-    const auto start = randomBytes(random, l.total());
-    for (int flags = 0; flags < 4; ++flags) {
-      for (const int alpha : {0, 1, 128, 254, 255}) {
-        expectSameOnEveryInstructionSet(
-            start,
-            [&](std::vector<std::uint8_t>& b) {
-              IPLClearAlphaChannelOf32BitAlphaFirstImage(b.data(), b.data() + l.destinationOffset(), l.width, l.height,
-                                                         l.imageRowBytes, l.destinationRowBytes,
-                                                         static_cast<std::uint8_t>(alpha), flags & 1, (flags >> 1) & 1);
-            },
-            "clear alpha flags " + std::to_string(flags) + " alpha " + std::to_string(alpha));
-        if (HasFatalFailure()) return;
-      }
-    }
-  }
+  expectSameForLayoutsFlagsAndLevels(
+      13, 4, {0, 1, 128, 254, 255}, [](const Layout& l, int flags, int alpha, std::vector<std::uint8_t>& b) {
+        IPLClearAlphaChannelOf32BitAlphaFirstImage(b.data(), b.data() + l.destinationOffset(), l.width, l.height,
+                                                   l.imageRowBytes, l.destinationRowBytes,
+                                                   static_cast<std::uint8_t>(alpha), flags & 1, (flags >> 1) & 1);
+      });
 }
 
 // Every pair of 8-bit values through the combined masks: the SIMD product
