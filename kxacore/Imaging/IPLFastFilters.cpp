@@ -184,11 +184,8 @@ void repeatedThreeTap(std::uint8_t* block, std::size_t length, std::size_t passe
   constexpr std::size_t kStages = 4;
   std::size_t left = passes;
   for (; left >= kStages; left -= kStages) threeTapSweep<kStages>(block, length);
+  static_assert(kStages == 4, "the remainder cases below cover 1 to kStages - 1 passes");
   switch (left) {
-    case 7: threeTapSweep<7>(block, length); break;
-    case 6: threeTapSweep<6>(block, length); break;
-    case 5: threeTapSweep<5>(block, length); break;
-    case 4: threeTapSweep<4>(block, length); break;
     case 3: threeTapSweep<3>(block, length); break;
     case 2: threeTapSweep<2>(block, length); break;
     case 1: threeTapSweep<1>(block, length); break;
